@@ -333,9 +333,9 @@ void AppendBase64(std::span<const std::byte> data, std::string& text) {
 
 const HashSeed& ProcessHashSeed() noexcept {
   static const HashSeed seed = [] {
-    // Kept only where the kernel has no randomness to give, which no supported kernel does.
-    HashSeed drawn{0x9E3779B97F4A7C15, 0xD1B54A32D192ED03};
-    static_cast<void>(::getentropy(&drawn, sizeof drawn));
+    HashSeed drawn{};
+    // Without randomness from the kernel, which no supported kernel lacks, any constants will do.
+    if (::getentropy(&drawn, sizeof drawn) != 0) drawn = {0x9E3779B97F4A7C15, 0xD1B54A32D192ED03};
     drawn.factor |= 1;
     return drawn;
   }();

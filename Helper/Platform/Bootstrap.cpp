@@ -1,0 +1,156 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// Check-in of a named service port: handed over by the launcher (sd_listen_fds(3) describes the
+// three variables) or bound by ourselves. Main thread, at start-up.
+#include <fcntl.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+
+#include <array>
+#include <cerrno>
+#include <charconv>
+#include <cstdlib>
+#include <cstring>
+#include <string_view>
+
+#include "Helper/Platform/PortEntry.h"
+#include "Helper/Platform/ProcessIdentity.h"
+
+namespace platform {
+namespace {
+
+constexpr int kFirstHandedOverDescriptor = 3;
+
+std::string_view Variable(const char* name) {
+  const char* value = std::getenv(name);  // NOLINT(concurrency-mt-unsafe): start-up, one thread
+  return value ? std::string_view(value) : std::string_view();
+}
+
+int Number(std::string_view text) {
+  int value = -1;
+  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
+  return error == std::errc{} && end == text.data() + text.size() ? value : -1;
+}
+
+/// The descriptor that the launcher handed over under `serviceName`, or an empty one.
+FileDescriptor HandedOver(std::string_view serviceName) {
+  if (Number(Variable("LISTEN_PID")) != ::getpid()) return {};
+  const int count = Number(Variable("LISTEN_FDS"));
+  std::string_view names = Variable("LISTEN_FDNAMES");
+  for (int index = 0; index < count; ++index) {
+    const std::size_t end = names.find(':');
+    if (names.substr(0, end) == serviceName) {
+      FileDescriptor descriptor(kFirstHandedOverDescriptor + index);
+      if (::fcntl(descriptor.get(), F_SETFD, FD_CLOEXEC) != 0) {
+        (void)descriptor.release();  // nothing open stands there, so there is nothing to close
+      }
+      return descriptor;
+    }
+    if (end == std::string_view::npos) break;
+    names.remove_prefix(end + 1);
+  }
+  return {};
+}
+
+bool IsDatagramSocket(int descriptor) {
+  int domain = 0;
+  int type = 0;
+  socklen_t length = sizeof domain;
+  return ::getsockopt(descriptor, SOL_SOCKET, SO_DOMAIN, &domain, &length) == 0 &&
+         ::getsockopt(descriptor, SOL_SOCKET, SO_TYPE, &type, &length) == 0 && domain == AF_UNIX &&
+         type == SOCK_DGRAM;
+}
+
+/// Asks the kernel to attest senders: their ids, and where it can their pidfd.
+bool AskForSenders(int descriptor) {
+  const int on = 1;
+  // Older kernels know no SO_PASSPIDFD: the receiver then opens the pidfd itself.
+  (void)::setsockopt(descriptor, SOL_SOCKET, kSocketPassPidfd, &on, sizeof on);
+  return ::setsockopt(descriptor, SOL_SOCKET, SO_PASSCRED, &on, sizeof on) == 0;
+}
+
+KernReturn CodeOfErrno() {
+  return errno == EMFILE || errno == ENFILE || errno == ENOMEM || errno == ENOBUFS
+             ? KERN_RESOURCE_SHORTAGE
+             : KERN_FAILURE;
+}
+
+/// Binds the service's socket. A socket that nobody serves any more is replaced.
+KernReturn Bind(const std::string& path, PortEntry& entry) {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  if (path.size() >= sizeof address.sun_path) return KERN_INVALID_ARGUMENT;
+  std::memcpy(static_cast<char*>(address.sun_path), path.c_str(), path.size() + 1);
+  const auto* name = reinterpret_cast<const sockaddr*>(&address);
+
+  FileDescriptor probe(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  if (!probe) return CodeOfErrno();
+  if (::connect(probe.get(), name, sizeof address) == 0) return KERN_NO_ACCESS;
+  if (errno == ECONNREFUSED) (void)::unlink(path.c_str());  // what matters is whether bind succeeds
+
+  FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  if (!socket || !AskForSenders(socket.get())) return CodeOfErrno();
+  // The mode of the unbound socket becomes the mode of the bound one: no moment of wider access.
+  if (::fchmod(socket.get(), S_IRUSR | S_IWUSR | S_IRGRP | S_IWGRP) != 0) return CodeOfErrno();
+  if (::bind(socket.get(), name, sizeof address) != 0) {
+    return errno == EADDRINUSE ? KERN_NO_ACCESS : CodeOfErrno();
+  }
+  entry.boundPath = BoundPath(path);
+  entry.receive = std::make_shared<const FileDescriptor>(std::move(socket));
+  return KERN_SUCCESS;
+}
+
+}  // namespace
+
+BoundPath::BoundPath(std::string path) : path_(std::move(path)) {
+  struct stat status {};
+  if (::lstat(path_.c_str(), &status) != 0) path_.clear();
+  device_ = status.st_dev;
+  inode_ = status.st_ino;
+}
+
+BoundPath::BoundPath(BoundPath&& other) noexcept
+    : path_(std::exchange(other.path_, {})), device_(other.device_), inode_(other.inode_) {}
+
+BoundPath& BoundPath::operator=(BoundPath&& other) noexcept {
+  std::swap(path_, other.path_);
+  std::swap(device_, other.device_);
+  std::swap(inode_, other.inode_);
+  return *this;
+}
+
+BoundPath::~BoundPath() {
+  struct stat status {};
+  if (path_.empty() || ::lstat(path_.c_str(), &status) != 0) return;
+  if (status.st_dev == device_ && status.st_ino == inode_) (void)::unlink(path_.c_str());
+}
+
+KernReturn BootstrapCheckIn(const char* serviceName, PortName& name) {
+  const std::string_view service(serviceName);
+  if (service.empty() || service.front() == '.' || service.find('/') != std::string_view::npos) {
+    return KERN_INVALID_ARGUMENT;
+  }
+  PortEntry entry;
+  if (FileDescriptor handedOver = HandedOver(service)) {
+    if (!IsDatagramSocket(handedOver.get()) || !AskForSenders(handedOver.get())) {
+      return KERN_FAILURE;
+    }
+    entry.receive = std::make_shared<const FileDescriptor>(std::move(handedOver));
+  } else {
+    const std::string directory = HALVEC_PORTS_DIRECTORY;
+    // The folder is the distribution's to make; where it did not, its default mode serves.
+    for (std::size_t end = directory.find('/', 1); end != std::string::npos;
+         end = directory.find('/', end + 1)) {
+      (void)::mkdir(directory.substr(0, end).c_str(),
+                    S_IRWXU | S_IRGRP | S_IXGRP | S_IROTH | S_IXOTH);
+    }
+    (void)::mkdir(directory.c_str(), S_IRWXU | S_IRGRP | S_IXGRP | S_IROTH | S_IXOTH);
+    const KernReturn code = Bind(directory + "/" + serviceName, entry);
+    if (code != KERN_SUCCESS) return code;
+  }
+  name = PortInsertEntry(std::move(entry));
+  return KERN_SUCCESS;
+}
+
+}  // namespace platform

@@ -1,0 +1,115 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "Helper/Platform/MigSource.h"
+
+#include <algorithm>
+#include <array>
+
+#include "Helper/Platform/PortMessage.h"
+#include "Helper/Platform/ProcessExit.h"
+#include "Helper/Platform/RunLoopCore.h"
+
+namespace platform {
+namespace {
+
+/// One buffer serves every source of a thread: a message is done with before the next is received.
+ReceiveBuffer& ThreadBuffer() {
+  static thread_local ReceiveBuffer buffer;
+  return buffer;
+}
+
+/// The code of a finished reply; a complex reply carries none and means success.
+KernReturn CodeOfReply(const std::byte* reply) {
+  const auto bits = wire::Load<std::uint32_t>(reply);
+  return (bits & wire::kComplexBit) != 0 ? KERN_SUCCESS
+                                         : wire::Load<KernReturn>(reply + wire::kReplyCodeOffset);
+}
+
+}  // namespace
+
+struct MigRunLoopSource::Watch : DescriptorWatch {
+  Watch(RunLoop& runLoop) : DescriptorWatch(runLoop), loop(runLoop) {}
+  RunLoop& loop;
+};
+
+void PrepareReply(const wire::MessageHeader& request, std::byte* reply, std::uint32_t replySize) {
+  std::fill_n(reply, std::max(replySize, wire::kErrorReplySize), std::byte{0});
+  wire::Store(reply, wire::MessageHeader{.size = wire::kErrorReplySize,
+                                         .id = request.id + wire::kReplyIdDistance});
+  wire::StoreReturnCode(reply, MIG_BAD_ID);
+}
+
+std::shared_ptr<MigRunLoopSource> MigRunLoopSource::Create(PortName port,
+                                                           const MigSubsystem* subsystem,
+                                                           int order) {
+  const auto rights = PortQuery(port);
+  if (!rights || !rights->receive || !subsystem || order != 0) return nullptr;
+  if (subsystem->maxReplySize > kMaxReplySize) return nullptr;
+  return std::shared_ptr<MigRunLoopSource>(
+      new MigRunLoopSource(port, PortReceiveDescriptor(port), rights->named, *subsystem));
+}
+
+MigRunLoopSource::MigRunLoopSource(PortName port, SharedDescriptor socket, bool named,
+                                   const MigSubsystem& subsystem)
+    : port_(port), socket_(std::move(socket)), named_(named), subsystem_(subsystem) {}
+
+MigRunLoopSource::~MigRunLoopSource() { invalidate(); }
+
+bool MigRunLoopSource::addTo(RunLoop& loop) {
+  if (!valid_ || watch_) return false;
+  auto watch = std::make_unique<Watch>(loop);
+  if (!watch->open(socket_->get())) return false;
+  watch_ = std::move(watch);
+  wait();
+  return true;
+}
+
+void MigRunLoopSource::invalidate() {
+  valid_ = false;
+  watch_.reset();
+}
+
+void MigRunLoopSource::wait() {
+  watch_->wait([weak = weak_from_this()] {
+    if (const auto source = weak.lock(); source && source->valid_) source->serveOne();
+  });
+}
+
+void MigRunLoopSource::serveOne() {
+  RunLoop& loop = watch_->loop;
+  ReceiveBuffer& request = ThreadBuffer();
+  const ReceiveStatus status = request.receive(port_, socket_->get(), named_);
+  if (status == ReceiveStatus::kEnded) {
+    // A client can end the channel that it shares with us; waiting on would only spin. What is
+    // left of the client goes when its own port dies.
+    watch_.reset();
+    return;
+  }
+  if (status == ReceiveStatus::kNothing) return wait();
+
+  alignas(std::max_align_t) std::array<std::byte, kMaxReplySize> reply;
+  const wire::MessageHeader header = request.header();
+  PrepareReply(header, reply.data(), subsystem_.maxReplySize);
+  if (status == ReceiveStatus::kRefused) {
+    wire::StoreReturnCode(reply.data(), request.refusal());
+  } else {
+    // A process that ended before this message came must be forgotten first: its process id may
+    // be the sender's by now.
+    if (named_) DeliverPendingProcessExits();
+    if (const MigStub stub = subsystem_.demultiplex(header)) stub(request.message(), reply.data());
+  }
+  const KernReturn code = CodeOfReply(reply.data());
+  if (code == KERN_SUCCESS) request.disownRights();
+  const int destination = request.replyRight() ? request.replyRight().get()
+                          : named_             ? -1
+                                               : socket_->get();
+  if (code != MIG_NO_REPLY) {
+    // A client that does not take its reply has lost it; there is nobody to tell. Without a
+    // destination the reply's own rights and memory are still given back.
+    (void)SendMessage(destination, reply.data());
+  }
+  request.clear();
+  loop.noteHandledSource();
+  if (watch_) wait();
+}
+
+}  // namespace platform
