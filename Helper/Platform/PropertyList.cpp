@@ -24,17 +24,7 @@ bool SameBits(double left, double right) noexcept {
 
 }  // namespace
 
-// Open addressing, at most half full; a slot holds the entry's position plus one.
-struct PropertyList::Dictionary::Index {
-  std::vector<std::uint32_t> slots;
-
-  void add(std::uint64_t hash, std::size_t position) noexcept {
-    const std::size_t mask = slots.size() - 1;
-    std::size_t slot = hash & mask;
-    while (slots[slot] != 0) slot = (slot + 1) & mask;
-    slots[slot] = static_cast<std::uint32_t>(position + 1);
-  }
-};
+struct PropertyList::Dictionary::Index : detail::TextIndex {};
 
 PropertyList::Dictionary::Dictionary() noexcept = default;
 PropertyList::Dictionary::Dictionary(const Dictionary& other)
@@ -50,27 +40,17 @@ PropertyList::Dictionary& PropertyList::Dictionary::operator=(Dictionary&& other
 PropertyList::Dictionary::~Dictionary() = default;
 
 std::size_t PropertyList::Dictionary::position(std::string_view key) const noexcept {
-  if (!index_) {
-    const auto found = std::find_if(entries_.begin(), entries_.end(),
-                                    [key](const Entry& entry) { return entry.key == key; });
-    return found == entries_.end() ? kAbsent : static_cast<std::size_t>(found - entries_.begin());
-  }
-  const std::size_t mask = index_->slots.size() - 1;
-  for (std::size_t slot = detail::HashText(key) & mask; index_->slots[slot] != 0;
-       slot = (slot + 1) & mask) {
-    const std::size_t candidate = index_->slots[slot] - 1;
-    if (entries_[candidate].key == key) return candidate;
-  }
-  return kAbsent;
+  const auto isKey = [this, key](std::size_t i) { return entries_[i].key == key; };
+  if (index_) return index_->find(detail::HashText(key), isKey).value_or(kAbsent);
+  std::size_t i = 0;
+  while (i < entries_.size() && !isKey(i)) ++i;
+  return i < entries_.size() ? i : kAbsent;
 }
 
 void PropertyList::Dictionary::reindex() {
-  if (entries_.size() <= kEntriesWithoutIndex) {
-    index_.reset();
-    return;
-  }
-  if (!index_) index_ = std::make_unique<Index>();
-  index_->slots.assign(std::bit_ceil(entries_.size() * 4), 0);
+  index_.reset();
+  if (entries_.size() <= kEntriesWithoutIndex) return;
+  index_ = std::make_unique<Index>();
   for (std::size_t i = 0; i < entries_.size(); ++i) {
     index_->add(detail::HashText(entries_[i].key), i);
   }
@@ -87,25 +67,25 @@ PropertyList* PropertyList::Dictionary::find(std::string_view key) noexcept {
 }
 
 PropertyList* PropertyList::Dictionary::insert(std::string key, PropertyList value) {
-  if (position(key) != kAbsent) return nullptr;
-  entries_.push_back({std::move(key), std::move(value)});
-  const std::size_t count = entries_.size();
-  if (count > kEntriesWithoutIndex) {
-    if (index_ && count * 2 <= index_->slots.size()) {
-      index_->add(detail::HashText(entries_.back().key), count - 1);
-    } else {
-      reindex();
-    }
+  if (!index_) {
+    if (position(key) != kAbsent) return nullptr;
+  } else {
+    const std::uint64_t hash = detail::HashText(key);
+    const auto isKey = [this, &key](std::size_t i) { return entries_[i].key == key; };
+    if (index_->find(hash, isKey)) return nullptr;
+    index_->add(hash, entries_.size());
   }
+  entries_.push_back({std::move(key), std::move(value)});
+  if (!index_) reindex();
   return &entries_.back().value;
 }
 
 void PropertyList::Dictionary::set(std::string key, PropertyList value) {
   if (PropertyList* old = find(key)) {
     *old = std::move(value);
-  } else {
-    insert(std::move(key), std::move(value));
+    return;
   }
+  insert(std::move(key), std::move(value));
 }
 
 bool PropertyList::Dictionary::erase(std::string_view key) {

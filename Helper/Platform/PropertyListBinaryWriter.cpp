@@ -4,7 +4,6 @@
 // texts only once; a second one writes them in that order.
 #include <bit>
 #include <cmath>
-#include <unordered_map>
 
 #include "Helper/Platform/PropertyListText.h"
 
@@ -13,10 +12,6 @@ namespace platform {
 namespace {
 
 constexpr std::string_view kMagic = "bplist00";
-
-struct SeededHash {
-  std::size_t operator()(std::string_view text) const noexcept { return detail::HashText(text); }
-};
 
 // Bytes that an unsigned number needs, of 1, 2, 4 or 8.
 std::size_t WidthOf(std::uint64_t number) noexcept {
@@ -83,10 +78,15 @@ class BinaryWriter {
 
   bool referText(std::string_view text) {
     if (++nodes_ > limits_.nodes || !charge(text.size())) return false;
-    const auto [found, isNew] =
-        texts_.try_emplace(text, static_cast<std::uint32_t>(objects_.size()));
-    if (isNew) objects_.push_back({nullptr, text, 0, 0});
-    refs_.push_back(found->second);
+    const std::uint64_t hash = detail::HashText(text);
+    const auto isSame = [this, text](std::size_t i) { return objects_[i].text == text; };
+    std::optional<std::size_t> position = texts_.find(hash, isSame);
+    if (!position) {
+      position = objects_.size();
+      texts_.add(hash, *position);
+      objects_.push_back({nullptr, text, 0, 0});
+    }
+    refs_.push_back(static_cast<std::uint32_t>(*position));
     return true;
   }
 
@@ -158,7 +158,8 @@ class BinaryWriter {
     if (!detail::IsPropertyListText(text, &ascii)) return false;
     if (ascii) {
       marker(0x50, text.size());
-      for (const char c : text) out_.push_back(static_cast<std::byte>(c));
+      const auto bytes = std::as_bytes(std::span(text));
+      out_.insert(out_.end(), bytes.begin(), bytes.end());
       return true;
     }
     units_.clear();
@@ -217,7 +218,11 @@ class BinaryWriter {
   }
 
   void put(std::uint64_t number, std::size_t width) {
-    for (std::size_t i = width; i-- > 0;) out_.push_back(static_cast<std::byte>(number >> (8 * i)));
+    std::array<std::byte, 8> bytes;
+    for (std::size_t i = 0; i < width; ++i) {
+      bytes[i] = static_cast<std::byte>(number >> (8 * (width - 1 - i)));
+    }
+    out_.insert(out_.end(), bytes.data(), bytes.data() + width);
   }
 
   void finish() {
@@ -236,7 +241,7 @@ class BinaryWriter {
   std::vector<Object> objects_;
   std::vector<std::uint32_t> refs_;
   std::vector<std::size_t> offsets_;
-  std::unordered_map<std::string_view, std::uint32_t, SeededHash> texts_;
+  detail::TextIndex texts_;
   std::u16string units_;
   std::vector<std::byte> out_;
   std::size_t refWidth_ = 1;

@@ -12,6 +12,8 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <utility>
+#include <vector>
 
 #include "Helper/Platform/PropertyList.h"
 
@@ -63,6 +65,56 @@ struct HashSeed {
   if (!text.empty()) std::memcpy(&word, text.data(), text.size());
   return fold(hash ^ word);
 }
+
+/// Finds positions in somebody else's list of texts: open addressing, at most half full. It holds
+/// part of each hash, so that a miss rarely looks at a text, and growing never does.
+class TextIndex {
+ public:
+  /// The position recorded for a text of this hash that `isSame(position)` confirms; none when
+  /// there is none.
+  template <class IsSame>
+  [[nodiscard]] std::optional<std::size_t> find(std::uint64_t hash, const IsSame& isSame) const {
+    if (slots_.empty()) return std::nullopt;
+    const auto part = static_cast<std::uint32_t>(hash);
+    const std::size_t mask = slots_.size() - 1;
+    for (std::size_t i = part & mask; slots_[i].position != 0; i = (i + 1) & mask) {
+      const std::size_t position = slots_[i].position - 1;
+      if (slots_[i].hash == part && isSame(position)) return position;
+    }
+    return std::nullopt;
+  }
+
+  /// Records `position` for a text of this hash that is not recorded yet.
+  void add(std::uint64_t hash, std::size_t position) {
+    if (++count_ * 2 > slots_.size()) grow();
+    put({static_cast<std::uint32_t>(hash), static_cast<std::uint32_t>(position + 1)});
+  }
+
+ private:
+  struct Slot {
+    std::uint32_t hash = 0;
+    std::uint32_t position = 0;  // plus one; 0 in an empty slot
+  };
+
+  void put(Slot slot) {
+    const std::size_t mask = slots_.size() - 1;
+    std::size_t i = slot.hash & mask;
+    while (slots_[i].position != 0) i = (i + 1) & mask;
+    slots_[i] = slot;
+  }
+
+  void grow() {
+    constexpr std::size_t kFirstSize = 64;
+    const std::vector<Slot> old =
+        std::exchange(slots_, std::vector<Slot>(slots_.empty() ? kFirstSize : slots_.size() * 2));
+    for (const Slot& slot : old) {
+      if (slot.position != 0) put(slot);
+    }
+  }
+
+  std::vector<Slot> slots_;
+  std::size_t count_ = 0;
+};
 
 /// The two readers behind ParsePropertyList; `reason` is never null.
 [[nodiscard]] std::optional<PropertyList> ParseXml(std::span<const std::byte> bytes,
