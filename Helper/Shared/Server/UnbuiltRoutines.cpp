@@ -1,0 +1,66 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// THE PLACE OF WHAT IS NOT BUILT YET. Each routine here answers KERN_FAILURE and does nothing; it
+// moves to its own folder, and its id out of UnbuiltRoutines.h, when its subsystem is built.
+#include "Helper/Shared/Server/RequestRoutines.h"
+
+KernReturn server_HvMobileHelperSetVoicemailToken(PortName, wire::Text<256>&) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperSetVoicemailTokenForKey(PortName, wire::Text<256>&,
+                                                        wire::Text<256>&) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperClearVoicemailToken(PortName) { return KERN_FAILURE; }
+KernReturn server_HvMobileHelperResetVoicemailRecords(PortName) { return KERN_FAILURE; }
+KernReturn server_HvMobileHelperCopyVoicemailTokenForKey(PortName, wire::Text<256>&,
+                                                         wire::Text<256>&) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperCopyVoicemailToken(PortName, wire::Text<256>&) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperSetCarrierBundleLink(PortName, wire::Text<1024>&, wire::Text<1024>&,
+                                                     wire::Text<1024>&) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperCreateSymlink(PortName, wire::Text<1024>&, wire::Text<1024>&) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperRemoveCarrierBundleLink(PortName, wire::Text<1024>&,
+                                                        wire::Text<1024>&) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperIsVoicemailSubscribed(PortName, wire::Flag&) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperTriggerHeartbeat(PortName, std::int32_t) { return KERN_FAILURE; }
+KernReturn server_HvMobileHelperTriggerDatabaseUpdate(PortName, std::uint32_t) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperCopyFile(PortName, wire::Text<256>&, wire::Text<256>&,
+                                         wire::Text<256>&, wire::Flag&) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperCopyCrashLogs(PortName, wire::Text<256>&, wire::Flag&) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperMoveCarrierBundles(PortName, wire::Text<256>&, wire::Text<256>&,
+                                                   wire::Text<256>&, wire::Flag&) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperRequestCountryCodeFromLocation(PortName, double, double) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperCopyCountryCode(PortName, wire::Text<64>&) { return KERN_FAILURE; }
+KernReturn server_HvMobileHelperSetRadioManagerLogging(PortName, std::int32_t) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperExtractArchive(PortName, wire::Text<256>&, wire::Text<256>&,
+                                               wire::Flag&) {
+  return KERN_FAILURE;
+}
+KernReturn server_HvMobileHelperCopyPropertyListFile(PortName, wire::Text<256>&, wire::Address*,
+                                                     std::uint32_t*) {
+  return KERN_FAILURE;
+}

@@ -1,0 +1,11 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// The request routines whose subsystem is still to be built, by id.
+#pragma once
+
+#include <array>
+#include <cstdint>
+
+inline constexpr std::array<std::int32_t, 20> kUnbuiltRequestIds{
+    8683549, 8683550, 8683551, 8683552, 8683553, 8683554, 8683558, 8683559, 8683560, 8683561,
+    8683562, 8683563, 8683564, 8683565, 8683566, 8683567, 8683568, 8683569, 8683570, 8683571};
