@@ -1,0 +1,202 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// The pure parts of the handset: texts in, values out. One thread.
+#include <gtest/gtest.h>
+#include <signal.h>
+
+#include <string>
+#include <vector>
+
+#include "Tools/handset/Entitlements.h"
+#include "Tools/handset/EventLoop.h"
+#include "Tools/handset/Failure.h"
+#include "Tools/handset/Json.h"
+#include "Tools/handset/Mounts.h"
+#include "Tools/handset/Options.h"
+#include "Tools/handset/SignalName.h"
+#include "Tools/handset/SystemLogCapture.h"
+#include "Tools/handset/UserDatabase.h"
+
+namespace handset {
+namespace {
+
+TEST(HandsetUsers, JoinTheHostsAndReplaceWhatWouldBeAmbiguous) {
+  EXPECT_EQ(PasswordTextWithHandsetUsers("root:x:0:0:root:/root:/bin/sh\n"
+                                         "mobile:x:7:7::/nowhere:/bin/sh\n"
+                                         "other:x:502:9::/home/other:/bin/sh"),
+            "root:x:0:0:root:/root:/bin/sh\n"
+            "mobile:x:501:501:Mobile User:/var/mobile:/bin/sh\n"
+            "halvec:x:502:502:Telephony Daemon:/var/empty:/bin/sh\n");
+  EXPECT_EQ(GroupTextWithHandsetGroups("root:x:0:\nothers:x:501:a,b\n"),
+            "root:x:0:\nmobile:x:501:\nhalvec:x:502:\n");
+}
+
+TEST(HandsetUsers, AreFoundByNameAndByNumber) {
+  const std::string text =
+      "broken\nbad:x:one:1::/:/bin/sh\nroot:x:0:0:root:/root:/bin/sh\n"
+      "mobile:x:501:20:Mobile User:/var/mobile:/bin/zsh\n";
+  for (const char* name : {"mobile", "501"}) {
+    const auto user = FindUser(text, name);
+    ASSERT_TRUE(user) << name;
+    EXPECT_EQ(user->name, "mobile");
+    EXPECT_EQ(user->uid, 501U);
+    EXPECT_EQ(user->gid, 20U);
+    EXPECT_EQ(user->home, "/var/mobile");
+    EXPECT_EQ(user->shell, "/bin/zsh");
+  }
+  EXPECT_FALSE(FindUser(text, "bad"));
+  EXPECT_FALSE(FindUser(text, "5010"));
+  EXPECT_FALSE(FindUser(text, ""));
+}
+
+TEST(HandsetUsers, HaveTheGroupsThatNameThem) {
+  const std::string text = "a:x:1:me\nb:x:2:you,me\nc:x:3:you\nd:x:4:\ne:x:five:me\n";
+  EXPECT_EQ(SupplementaryGroups(text, "me"), (std::vector<gid_t>{1, 2}));
+}
+
+TEST(LogDatagram, IsTakenApartWithoutTouchingTheText) {
+  const LogEntry entry =
+      ParseLogDatagram("<27>Nov  1 02:03:04 HalvecMobileHelper[12]: a: b [x]: \n");
+  EXPECT_EQ(entry.facility, 3);
+  EXPECT_EQ(entry.priority, 3);
+  EXPECT_EQ(entry.identifier, "HalvecMobileHelper");
+  EXPECT_EQ(entry.text, "a: b [x]: \n");
+  EXPECT_EQ(ParseLogDatagram("<13>name: text").identifier, "name");
+  EXPECT_EQ(ParseLogDatagram("<13>name: text").text, "text");
+  EXPECT_EQ(ParseLogDatagram("<191>x").facility, 23);
+}
+
+TEST(LogDatagram, KeepsAMalformedHeaderInTheText) {
+  for (const std::string text :
+       {"", "<", "<>x", "<192>x", "<1234>x", "<-1>x", "<a>x", "no tag here: x", "name[]: x",
+        "name[1x]: x", "[1]: x", ": x", "Nov 01 02-03-04 x", "name[12: x"}) {
+    const LogEntry entry = ParseLogDatagram(text);
+    EXPECT_EQ(entry.text, text);
+    EXPECT_EQ(entry.raw, text);
+    EXPECT_EQ(entry.identifier, "");
+    EXPECT_EQ(entry.priority, 5);
+    EXPECT_EQ(entry.facility, 1);
+  }
+}
+
+TEST(LogDatagram, IsShownWithExactlyOneNewline) {
+  LogEntry entry;
+  entry.priority = 3;
+  for (const char* text : {"x", "x\n", "x\n\n"}) {
+    entry.text = text;
+    EXPECT_EQ(LogEntryLine(entry), "<3>x\n");
+  }
+}
+
+TEST(Json, EscapesWhatItMust) {
+  EXPECT_EQ(JsonString("a\"b\\c\n\t\x7f \xC3\xA9"), "\"a\\\"b\\\\c\\n\\u0009\\u007f \xC3\xA9\"");
+  EXPECT_EQ(JsonString(std::string_view("\0", 1)), "\"\\u0000\"");
+  EXPECT_EQ(JsonString("\xff\xC3"), "\"\\ufffd\\ufffd\"");
+  EXPECT_EQ(HexOf("\x01\xfe"), "01fe");
+}
+
+TEST(Json, KnowsUtf8) {
+  for (const char* good : {"", "a", "\xC2\x80", "\xE0\xA0\x80", "\xED\x9F\xBF", "\xF0\x90\x80\x80",
+                           "\xF4\x8F\xBF\xBF"}) {
+    EXPECT_TRUE(IsUtf8(good)) << HexOf(good);
+  }
+  for (const char* bad : {"\x80", "\xC1\x81", "\xE0\x9F\xBF", "\xED\xA0\x80", "\xF0\x8F\xBF\xBF",
+                          "\xF4\x90\x80\x80", "\xF5\x80\x80\x80", "\xC3", "\xE2\x82", "a\xff"}) {
+    EXPECT_FALSE(IsUtf8(bad)) << HexOf(bad);
+  }
+}
+
+TEST(MountPoints, AreTheTopmostOnesBelowAFolder) {
+  const std::string text =
+      "1 0 8:1 / / rw - ext4 a rw\n"
+      "2 1 8:1 / /var rw - ext4 a rw\n"
+      "3 2 8:1 / /var/lib/data/inner rw - ext4 a rw\n"
+      "4 2 8:1 / /var/lib/data rw - ext4 a rw\n"
+      "5 2 8:1 / /var/lib/data rw - ext4 a rw\n"
+      "6 2 8:1 / /various rw - ext4 a rw\n"
+      "7 2 8:1 / /var/with\\040blank rw - ext4 a rw\n";
+  EXPECT_EQ(MountPointsBelow(text, "/var"),
+            (std::vector<std::string>{"/var/lib/data", "/var/with blank"}));
+  EXPECT_TRUE(MountPointsBelow(text, "/etc").empty());
+}
+
+TEST(RunOptions, AreTakenApart) {
+  const RunOptions options =
+      ParseRunOptions({"--helper", "/h", "--bind=/a:/b", "--bind", "/c", "--install", "/x/y",
+                       "--install=/x/y:z", "--queue=512", "--verbose", "--", "cmd", "--helper"});
+  EXPECT_EQ(options.helper, "/h");
+  EXPECT_TRUE(options.verbose);
+  EXPECT_EQ(options.queue, 512U);
+  using Pairs = std::vector<std::pair<std::string, std::string>>;
+  EXPECT_EQ(options.binds, (Pairs{{"/a", "/b"}, {"/c", "/c"}}));
+  EXPECT_EQ(options.installs, (Pairs{{"/x/y", "y"}, {"/x/y", "z"}}));
+  EXPECT_EQ(options.command, (std::vector<std::string>{"cmd", "--helper"}));
+}
+
+TEST(RunOptions, AreRefusedWhereTheyDoNotParse) {
+  using Words = std::vector<std::string>;
+  for (const Words& words :
+       {Words{}, Words{"--verbose"}, Words{"--helper"}, Words{"--what", "x"},
+        Words{"--verbose=1", "x"}, Words{"--queue", "x", "cmd"}, Words{"--queue", "-1", "cmd"},
+        Words{"--bind", "relative", "cmd"}, Words{"--bind", "/a:b", "cmd"}}) {
+    try {
+      static_cast<void>(ParseRunOptions(words));
+      ADD_FAILURE() << "accepted " << words.size() << " words";
+    } catch (const Failure& failure) {
+      EXPECT_EQ(failure.status(), kStatusUsage) << failure.what();
+    }
+  }
+}
+
+TEST(RunOptions, TakeSecondsWithFractions) {
+  EXPECT_EQ(Milliseconds("1.5"), 1500);
+  EXPECT_EQ(Milliseconds("0"), 0);
+  EXPECT_EQ(Milliseconds("0.0001"), 1);
+  for (const char* bad : {"", "-1", "x", "1s", "nan", "inf", "1e300"}) {
+    EXPECT_THROW(static_cast<void>(Milliseconds(bad)), Failure) << bad;
+  }
+}
+
+TEST(Entitlement, HasAFileNameOfItsOwnPerExecutable) {
+  EXPECT_EQ(EntitlementFileName("/usr/libexec/a"), "usr%2Flibexec%2Fa.plist");
+  EXPECT_EQ(EntitlementFileName("/usr%2Flibexec/a"), "usr%252Flibexec%2Fa.plist");
+}
+
+TEST(Entitlement, IsWrittenAsAPropertyList) {
+  EXPECT_EQ(EntitlementPropertyList("/a<&>b", "501", {{"n", "<false/>"}, {"m", "<string/>"}}),
+            "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n<dict>\n"
+            "  <key>Executable</key>\n  <string>/a&lt;&amp;&gt;b</string>\n"
+            "  <key>User</key>\n  <integer>501</integer>\n"
+            "  <key>Entitlements</key>\n  <dict>\n"
+            "    <key>n</key>\n    <false/>\n    <key>m</key>\n    <string/>\n"
+            "  </dict>\n</dict>\n</plist>\n");
+}
+
+TEST(SignalName, IsFoundInEveryForm) {
+  EXPECT_EQ(SignalNumber("KILL"), SIGKILL);
+  EXPECT_EQ(SignalNumber("SIGTERM"), SIGTERM);
+  EXPECT_EQ(SignalNumber("6"), SIGABRT);
+  EXPECT_EQ(SignalNumber("NOSUCH"), std::nullopt);
+  EXPECT_EQ(SignalNumber("0"), std::nullopt);
+  EXPECT_EQ(SignalNumber(""), std::nullopt);
+}
+
+TEST(HandsetEventLoop, RunsDeadlinesInTimeAndNoCancelledOne) {
+  EventLoop loop;
+  int ran = 0;
+  const auto now = EventLoop::Clock::now();
+  const EventLoop::Ticket cancelled = loop.at(now, [&] { ran += 100; });
+  static_cast<void>(loop.at(now, [&] {
+    ++ran;
+    static_cast<void>(loop.at(now, [&] {
+      ++ran;
+      loop.stop();
+    }));
+  }));
+  loop.cancel(cancelled);
+  loop.run();
+  EXPECT_EQ(ran, 2);
+}
+
+}  // namespace
+}  // namespace handset
