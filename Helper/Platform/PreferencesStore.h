@@ -27,7 +27,8 @@ class PreferencesStore {
  public:
   virtual ~PreferencesStore() = default;
 
-  /// The value of `key`, changes not yet synchronized included; none when it is absent.
+  /// The value of `key`, changes not yet synchronized included; none when it is absent. Shows what
+  /// other processes stored no later than the next synchronize().
   [[nodiscard]] virtual std::optional<PropertyList> copyValue(const std::string& key,
                                                               const PreferenceDomain& domain) = 0;
 
@@ -37,7 +38,9 @@ class PreferencesStore {
                         const PreferenceDomain& domain) = 0;
 
   /// Writes the pending changes of `domain` durably and picks up what other processes wrote. False
-  /// when a pending change could not be written; it stays pending, and the store logs why.
+  /// when a pending change could not be written; the store logs why. It stays pending, unless it
+  /// never can be stored (the domain would exceed what a property list may hold): then the domain's
+  /// pending changes are dropped.
   virtual bool synchronize(const PreferenceDomain& domain) = 0;
 
   /// The value of `key` as an application sees it: the first found of current user and current
