@@ -62,11 +62,11 @@ TEST_F(HandsetIsolation, HasOneMobileHomeUnderTwoNames) {
 }
 
 TEST_F(HandsetIsolation, KeepsEveryWriteFromTheHost) {
-  const TemporaryFolder folder;
   const std::string name = "handset-test-" + std::to_string(getpid());
   const std::vector<std::string> places{"/etc/", "/usr/bin/", "/var/lib/", "/tmp/", "/run/", "/"};
   std::string script = "set -e\n";
-  for (const std::string& place : places) script.append("touch " + place + name + "\n");
+  for (const std::string& place : places)
+    script.append("touch ").append(place).append(name).append("\n");
   const Outcome run = RunHandset(script + "echo written");
   EXPECT_EQ(run.output, "written\n") << run.errors;
   for (const std::string& place : places) {

@@ -44,6 +44,7 @@ Child Start(const std::vector<std::string>& arguments) {
   Pipe output = MakePipe();
   Pipe errors = MakePipe();
   std::vector<char*> pointers;
+  pointers.reserve(arguments.size() + 1);
   for (const std::string& text : arguments) pointers.push_back(const_cast<char*>(text.c_str()));
   pointers.push_back(nullptr);
   const pid_t pid = fork();

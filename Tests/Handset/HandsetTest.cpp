@@ -191,8 +191,8 @@ TEST_F(Handset, RefusesToEntitleWhatTheSystemWouldNotTrust) {
   EXPECT_EQ(run.output, "");
   for (const char* reason :
        {"/tmp is writable by others", "link is a symbolic link", "loose is writable by others",
-        "foreign is not root's", "it is not an executable file", "No such file or directory",
-        "the path is not absolute"}) {
+        "foreign is not root's", "halvec is not an executable file", "No such file or directory",
+        "relative is not an absolute path"}) {
     EXPECT_NE(run.errors.find(reason), std::string::npos) << reason << " in:\n" << run.errors;
   }
   EXPECT_EQ(RunHandset("handset entitle --unchecked relative nobody; "

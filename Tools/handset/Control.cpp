@@ -29,7 +29,7 @@ namespace {
 constexpr char kOutput = 'O';
 constexpr char kError = 'E';
 constexpr char kExit = 'X';
-constexpr std::size_t kLongestPacket = 32 * 1024;
+constexpr std::size_t kLongestPacket = std::size_t{32} * 1024;
 constexpr int kNoLimit = -1;
 
 std::vector<std::string> SplitWords(std::string_view question) {

@@ -90,14 +90,16 @@ std::string EntitlementPropertyList(const std::string& executable, const std::st
                                     const EntitlementValues& values) {
   std::string text =
       "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n<dict>\n";
-  text += "  <key>Executable</key>\n  <string>" + XmlText(executable) + "</string>\n";
-  const std::string kind = IsNumber(user) ? "integer" : "string";
-  text += "  <key>User</key>\n  <" + kind + ">" + XmlText(user) + "</" + kind + ">\n";
-  text += "  <key>Entitlements</key>\n  <dict>\n";
+  const auto add = [&text](const auto&... parts) { (text.append(parts), ...); };
+  const char* kind = IsNumber(user) ? "integer>" : "string>";
+  add("  <key>Executable</key>\n  <string>", XmlText(executable), "</string>\n");
+  add("  <key>User</key>\n  <", kind, XmlText(user), "</", kind, "\n");
+  add("  <key>Entitlements</key>\n  <dict>\n");
   for (const auto& [name, value] : values) {
-    text += "    <key>" + XmlText(name) + "</key>\n    " + value + "\n";
+    add("    <key>", XmlText(name), "</key>\n    ", value, "\n");
   }
-  return text + "  </dict>\n</dict>\n</plist>\n";
+  add("  </dict>\n</dict>\n</plist>\n");
+  return text;
 }
 
 std::string EntitlementFileName(const std::string& executable) {
@@ -115,22 +117,23 @@ std::string EntitlementFileName(const std::string& executable) {
 }
 
 void RequireEntitleable(const std::string& path) {
-  const std::string refused = path + " cannot be entitled: ";
-  const std::string advice = "; `handset install` puts a copy where it can be";
-  if (!path.starts_with('/')) throw Failure(refused + "the path is not absolute");
+  const auto refuse = [&path](const std::string& item, const char* reason) {
+    std::string text = path;
+    text.append(" cannot be entitled: ").append(item).append(reason);
+    throw Failure(text.append("; `handset install` puts a copy where it can be"));
+  };
+  if (!path.starts_with('/')) refuse(path, " is not an absolute path");
   for (std::size_t end = 0; end != std::string::npos;) {
     end = path.find('/', end + 1);
-    const std::string part = end == std::string::npos ? path : path.substr(0, end);
+    const std::string item = path.substr(0, end);
     struct stat facts {};
-    if (lstat(part.c_str(), &facts) != 0) throw Failure::FromErrno(refused + part);
-    if (S_ISLNK(facts.st_mode)) throw Failure(refused + part + " is a symbolic link" + advice);
-    if (facts.st_uid != 0) throw Failure(refused + part + " is not root's" + advice);
-    if ((facts.st_mode & (S_IWGRP | S_IWOTH)) != 0) {
-      throw Failure(refused + part + " is writable by others than root" + advice);
-    }
-    const bool last = end == std::string::npos;
-    if (last && (!S_ISREG(facts.st_mode) || (facts.st_mode & 0111U) == 0)) {
-      throw Failure(refused + "it is not an executable file");
+    if (lstat(item.c_str(), &facts) != 0) throw Failure::FromErrno(item);
+    if (S_ISLNK(facts.st_mode)) refuse(item, " is a symbolic link");
+    if (facts.st_uid != 0) refuse(item, " is not root's");
+    if ((facts.st_mode & (S_IWGRP | S_IWOTH)) != 0) refuse(item, " is writable by others");
+    const bool isLast = end == std::string::npos;
+    if (isLast && (!S_ISREG(facts.st_mode) || (facts.st_mode & 0111U) == 0)) {
+      refuse(item, " is not an executable file");
     }
   }
 }

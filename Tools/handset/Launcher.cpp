@@ -29,10 +29,9 @@ namespace handset {
 namespace {
 
 constexpr int kFirstHandedOver = 3;
-/// So many instances in a row that end without having served anything are a crash loop if they
-/// fall into so short a time.
-constexpr std::size_t kMostUselessExits = 10;
-constexpr std::chrono::seconds kUselessExitWindow{2};
+/// So many instances in a row that end without having taken the message that they were started for
+/// are a crash loop.
+constexpr unsigned kMostUselessExits = 10;
 
 /// In the child: the port becomes descriptor 3, everything behind it is closed.
 Environment HandOver(int port) {
@@ -117,7 +116,7 @@ void Launcher::lookAtPort() {
 bool Launcher::startNow() {
   if (running_) return false;
   isStopped_ = false;
-  uselessExits_.clear();
+  uselessExits_ = 0;
   start("request");
   return true;
 }
@@ -155,22 +154,19 @@ void Launcher::childEnded(pid_t pid, int waitStatus) {
              ",\"lived_ms\":" + std::to_string(exit.lived.count()),
          "helper " + std::to_string(pid) + " " + Describe(exit));
   // However it ended: an instance that took its message is no loop, for the message is gone.
-  if (startedFor_ && peekFrontMessage() == startedFor_) {
-    noteUselessExit();
+  const bool isUseless = startedFor_ && peekFrontMessage() == startedFor_;
+  uselessExits_ = isUseless ? uselessExits_ + 1 : 0;
+  if (uselessExits_ < kMostUselessExits) {
+    watchPort();
   } else {
-    uselessExits_.clear();
+    stop();
   }
-  if (!isStopped_) watchPort();
 }
 
-void Launcher::noteUselessExit() {
-  const Clock::time_point now = Clock::now();
-  uselessExits_.push_back(now);
-  while (now - uselessExits_.front() > kUselessExitWindow) uselessExits_.pop_front();
-  if (uselessExits_.size() < kMostUselessExits) return;
+void Launcher::stop() {
   isStopped_ = true;
   const std::string text = "the helper ended " + std::to_string(kMostUselessExits) +
-                           " times in 2 s without serving a message; it is not started any more";
+                           " times in a row without serving a message; it is not started any more";
   report("stop", ",\"reason\":" + JsonString(text), text);
   if (!verbose_) static_cast<void>(std::fprintf(stderr, "handset: %s\n", text.c_str()));
 }

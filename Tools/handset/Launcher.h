@@ -9,7 +9,6 @@
 #include <sys/types.h>
 
 #include <cstdint>
-#include <deque>
 #include <functional>
 #include <optional>
 #include <string>
@@ -81,7 +80,7 @@ class Launcher {
   void watchPort();
   [[nodiscard]] bool isMessageQueued() const;
   [[nodiscard]] FrontMessage peekFrontMessage() const;
-  void noteUselessExit();
+  void stop();
   void report(const std::string& event, const std::string& fields, const std::string& text);
 
   EventLoop& loop_;
@@ -96,7 +95,7 @@ class Launcher {
   unsigned starts_ = 0;
   unsigned exits_ = 0;
   std::optional<HelperExit> last_;
-  std::deque<Clock::time_point> uselessExits_;
+  unsigned uselessExits_ = 0;  ///< In a row.
   bool isStopped_ = false;
   std::function<void()> changed_;
 };

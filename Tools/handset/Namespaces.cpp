@@ -74,7 +74,7 @@ int RunInNamespaces(const std::function<int()>& first) {
   sigemptyset(&watched);
   for (const int signal : {SIGCHLD, SIGTERM, SIGINT, SIGHUP}) sigaddset(&watched, signal);
   sigset_t before;
-  sigprocmask(SIG_BLOCK, &watched, &before);
+  pthread_sigmask(SIG_BLOCK, &watched, &before);
   const FileDescriptor ownNamespace(open("/proc/self/ns/pid", O_RDONLY | O_CLOEXEC));
   if (!ownNamespace) throw Failure::FromErrno("open /proc/self/ns/pid");
   FileDescriptor parent(static_cast<int>(syscall(SYS_pidfd_open, getpid(), 0)));
@@ -92,7 +92,7 @@ int RunInNamespaces(const std::function<int()>& first) {
     throw Failure::FromErrno("setns");
   }
   const int status = WaitAndPassSignalsOn(child, watched);
-  sigprocmask(SIG_SETMASK, &before, nullptr);
+  pthread_sigmask(SIG_SETMASK, &before, nullptr);
   return status;
 }
 

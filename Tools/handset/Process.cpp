@@ -100,7 +100,7 @@ void RestoreSignals() {
   }
   sigset_t none;
   sigemptyset(&none);
-  sigprocmask(SIG_SETMASK, &none, nullptr);
+  pthread_sigmask(SIG_SETMASK, &none, nullptr);
 }
 
 void BecomeProgram(const std::vector<std::string>& arguments, const Environment& environment) {

@@ -32,7 +32,7 @@ using platform::FileDescriptor;
 /// is looked up below it afterwards.
 constexpr const char* kBuildingSite = "/proc";
 
-constexpr std::array<std::string_view, 3> kLayered{"etc", "usr", "var"};
+constexpr std::array<std::string_view, 3> kLayered{"/etc", "/usr", "/var"};
 constexpr std::array<std::string_view, 9> kOwn{"proc", "sys",     "dev",     "tmp",       "run",
                                                "root", "private", "Library", "lost+found"};
 constexpr std::array<const char*, 6> kDevices{"/dev/null",   "/dev/zero",    "/dev/full",
@@ -116,7 +116,7 @@ FromHost TakeFromHost(const RunOptions& options) {
   for (const std::string_view folder : kLayered) {
     // A layer shows what lies below the host's mounts there, not the mounts: put them back, so
     // that what the host covers stays covered.
-    for (std::string& point : MountPointsBelow(mounts, "/" + std::string(folder))) {
+    for (std::string& point : MountPointsBelow(mounts, std::string(folder))) {
       host.covers.push_back(Take(point, point, Access::kReadOnly));
     }
   }
@@ -126,7 +126,7 @@ FromHost TakeFromHost(const RunOptions& options) {
 /// Folders and links of the host's root that the handset shows as they are.
 struct TopLevel {
   std::vector<PendingTree> folders;
-  std::vector<std::pair<std::string, std::string>> links;  ///< Name, target.
+  std::vector<std::pair<std::string, std::string>> links;  ///< Path, target.
 };
 
 TopLevel TakeTopLevel() {
@@ -137,8 +137,8 @@ TopLevel TakeTopLevel() {
   // NOLINTNEXTLINE(concurrency-mt-unsafe)
   while (const dirent* entry = readdir(root.get())) {
     const std::string name = static_cast<const char*>(entry->d_name);
-    if (name == "." || name == ".." || Contains(kOwn, name) || Contains(kLayered, name)) continue;
     const std::string path = "/" + name;
+    if (name == "." || name == ".." || Contains(kOwn, name) || Contains(kLayered, path)) continue;
     struct stat facts {};
     if (lstat(path.c_str(), &facts) != 0) continue;
     if (S_ISDIR(facts.st_mode)) {
@@ -147,7 +147,7 @@ TopLevel TakeTopLevel() {
       std::array<char, 4096> target{};
       const ssize_t length = readlink(path.c_str(), target.data(), target.size());
       if (length < 0) throw Failure::FromErrno("readlink " + path);
-      top.links.emplace_back(name, std::string(target.data(), static_cast<std::size_t>(length)));
+      top.links.emplace_back(path, std::string(target.data(), static_cast<std::size_t>(length)));
     }
   }
   return top;
@@ -157,8 +157,8 @@ void BuildSkeleton(const TopLevel& top) {
   const std::string site = kBuildingSite;
   MountNew("tmpfs", site, "mode=755", 0);
   for (const auto& [name, target] : top.links) {
-    if (symlink(target.c_str(), (site + "/" + name).c_str()) != 0) {
-      throw Failure::FromErrno("link /" + name);
+    if (symlink(target.c_str(), (site + name).c_str()) != 0) {
+      throw Failure::FromErrno("link " + name);
     }
   }
   for (const PendingTree& folder : top.folders) {
@@ -167,17 +167,19 @@ void BuildSkeleton(const TopLevel& top) {
   }
   // The upper layers live in a file system of their own that nobody can name once it is detached:
   // the overlays keep it.
-  const std::string store = site + "/layers";
+  const std::string store = std::string(kBuildingSite) + "/layers";
   MountMemory(store, "700");
   for (const std::string_view name : kLayered) {
     const std::string folder(name);
-    const std::string upper = store + "/" + folder;
-    const std::string work = store + "/" + folder + ".work";
+    const std::string place = site + folder;
+    const std::string upper = store + folder;
+    const std::string work = upper + ".work";
     MakeDirectories(upper);
     MakeDirectories(work);
-    MakeDirectories(site + "/" + folder);
-    MountNew("overlay", site + "/" + folder,
-             "lowerdir=/" + folder + ",upperdir=" + upper + ",workdir=" + work, 0);
+    MakeDirectories(place);
+    std::string layers = "lowerdir=" + folder;
+    layers.append(",upperdir=").append(upper).append(",workdir=").append(work);
+    MountNew("overlay", place, layers, 0);
   }
   if (umount2(store.c_str(), MNT_DETACH) != 0 || rmdir(store.c_str()) != 0) {
     throw Failure::FromErrno("detach the layers");

@@ -76,7 +76,7 @@ void Session::watchSignals() {
   sigset_t watched;
   sigemptyset(&watched);
   for (const int signal : {SIGCHLD, SIGTERM, SIGINT, SIGHUP}) sigaddset(&watched, signal);
-  sigprocmask(SIG_BLOCK, &watched, nullptr);
+  pthread_sigmask(SIG_BLOCK, &watched, nullptr);
   signals_.reset(signalfd(-1, &watched, SFD_CLOEXEC | SFD_NONBLOCK));
   if (!signals_) throw Failure::FromErrno("signalfd");
   // The watch lasts as long as the loop, and so does the descriptor.

@@ -62,7 +62,7 @@ class SystemLogCapture {
   void onEntry(std::function<void()> action) { changed_ = std::move(action); }
 
  private:
-  static constexpr std::size_t kLongestDatagram = 256 * 1024;
+  static constexpr std::size_t kLongestDatagram = std::size_t{256} * 1024;
 
   [[nodiscard]] bool receiveOne();
   void keep(LogEntry entry);
