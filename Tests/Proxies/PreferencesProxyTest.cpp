@@ -1,0 +1,207 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// The preferences proxy over real ports, on a fake store.
+#include "Helper/Platform/TaskMemory.h"
+#include "Tests/Fakes/FakePreferencesStore.h"
+#include "Tests/Support/ServerFixture.h"
+
+namespace {
+
+using platform::LogPriority;
+using platform::PropertyList;
+using support::Bytes;
+using support::Get;
+using support::Put;
+using Lines = std::vector<fakes::FakeSystemLog::Line>;
+
+constexpr std::int32_t kSet = 8683555;
+constexpr std::int32_t kCopy = 8683556;
+constexpr std::int32_t kCopyApp = 8683557;
+constexpr char kXml[] =
+    "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n"
+    "<string>value</string>\n</plist>\n";
+
+/// Memory that can be made to run out.
+class FailingMemory final : public platform::TaskMemory {
+ public:
+  KernReturn allocate(platform::VmAddress& address, std::size_t size) override {
+    if (fails) return KERN_NO_SPACE;
+    ++regions;
+    return real.allocate(address, size);
+  }
+  void deallocate(platform::VmAddress address, std::size_t size) override {
+    --regions;
+    real.deallocate(address, size);
+  }
+  platform::TaskMemory& real = platform::DefaultProvider<platform::TaskMemory>();
+  bool fails = false;
+  int regions = 0;
+};
+
+class PreferencesProxy : public support::ServerFixture {
+ protected:
+  void SetUp() override {
+    start();
+    client = connect();
+  }
+  static Bytes setRequest(const std::string& domain, const std::string& key,
+                          const std::string& value) {
+    Bytes bytes(568);
+    Put(bytes, 0, 0x80000000U);
+    Put(bytes, 4, 568U);
+    Put(bytes, 20, kSet);
+    Put(bytes, 24, 1U);
+    bytes[39] = 1;
+    Put(bytes, 40, static_cast<std::uint32_t>(value.size()));
+    support::PutText(bytes, 52, domain);
+    support::PutText(bytes, 308, key);
+    Put(bytes, 564, static_cast<std::uint32_t>(value.size()));
+    bytes.insert(bytes.end(), value.begin(), value.end());
+    return bytes;
+  }
+  std::int32_t set(const std::string& value, const std::string& domain = "domain",
+                   const std::string& key = "key") {
+    return Get<std::int32_t>(request(*client, setRequest(domain, key, value)).bytes, 32);
+  }
+  Bytes copy(std::int32_t id, const std::string& domain = "domain",
+             const std::string& key = "key") {
+    Bytes bytes = support::Message(id, 544);
+    support::PutText(bytes, 32, domain);
+    support::PutText(bytes, 288, key);
+    return request(*client, bytes).bytes;
+  }
+  static Bytes withContent(std::int32_t id, const std::string& content) {
+    Bytes reply(56);
+    Put(reply, 0, 0x80000000U);
+    Put(reply, 4, 56U);
+    Put(reply, 20, id + 100);
+    Put(reply, 24, 1U);
+    reply[36] = 1;
+    reply[37] = 1;
+    reply[39] = 1;
+    Put(reply, 40, static_cast<std::uint32_t>(content.size()));
+    reply[48] = 1;
+    Put(reply, 52, static_cast<std::uint32_t>(content.size()));
+    reply.insert(reply.end(), content.begin(), content.end());
+    return reply;
+  }
+  std::optional<PropertyList> stored() { return store.copyValue("key", {.identifier = "domain"}); }
+
+  fakes::FakePreferencesStore store;
+  platform::ScopedReplacement<platform::PreferencesStore> storeReplacement{store};
+  FailingMemory memory;
+  platform::ScopedReplacement<platform::TaskMemory> memoryReplacement{memory};
+  std::unique_ptr<support::WireClient> client;
+};
+
+TEST_F(PreferencesProxy, SetStoresTheValueForTheCurrentUserAndAnyHost) {
+  EXPECT_EQ(set("<plist version=\"1.0\"><integer>7</integer></plist>"), 0);
+  EXPECT_EQ(stored(), PropertyList(7));
+  EXPECT_FALSE(
+      store.copyValue("key", {.identifier = "domain", .user = platform::UserScope::kAnyUser}));
+  EXPECT_TRUE(log.takeLines().empty());
+}
+
+TEST_F(PreferencesProxy, SetTakesTheBinaryForm) {
+  const auto binary = platform::SerializeBinary(PropertyList("value"));
+  ASSERT_TRUE(binary);
+  EXPECT_EQ(set(std::string(reinterpret_cast<const char*>(binary->data()), binary->size())), 0);
+  EXPECT_EQ(stored(), PropertyList("value"));
+}
+
+TEST_F(PreferencesProxy, SetOfOneByteRemovesTheKeyWhateverTheByte) {
+  for (const char byte : {'\0', 'x', '<', '\xff'}) {
+    ASSERT_EQ(set(kXml), 0);
+    ASSERT_TRUE(stored());
+    EXPECT_EQ(set(std::string(1, byte)), 0);
+    EXPECT_FALSE(stored());
+  }
+}
+
+TEST_F(PreferencesProxy, SetOfTwoBytesThatAreNoPropertyListAnswers5AndLeavesTheStoredValueAlone) {
+  ASSERT_EQ(set(kXml), 0);
+  EXPECT_EQ(set("xy"), 5);
+  EXPECT_EQ(stored(), PropertyList("value"));
+}
+
+TEST_F(PreferencesProxy, SetOfNoBytesAnswers5) { EXPECT_EQ(set(""), 5); }
+
+TEST_F(PreferencesProxy, SetWithADomainOrKeyThatIsNotUtf8Answers5) {
+  EXPECT_EQ(set(kXml, "\xff"), 5);
+  EXPECT_EQ(set(kXml, "domain", "\xc0\x80"), 5);
+  EXPECT_EQ(set("x", "\xff"), 5) << "also when it means a removal";
+}
+
+TEST_F(PreferencesProxy, ReadsATextWithoutItsZeroUpToItsLastByteButOne) {
+  EXPECT_EQ(set(kXml, std::string(256, 'd'), std::string(256, 'k')), 0);
+  EXPECT_TRUE(store.copyValue(std::string(255, 'k'), {.identifier = std::string(255, 'd')}));
+}
+
+TEST_F(PreferencesProxy, CopyAnswersTheXmlFormAndLogsTheAllocation) {
+  ASSERT_EQ(set(kXml), 0);
+  EXPECT_EQ(copy(kCopy), withContent(kCopy, kXml));
+  EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 96l (mhs1)\n"}}));
+  EXPECT_EQ(memory.regions, 0) << "the region leaves with the reply";
+}
+
+TEST_F(PreferencesProxy, AppCopySearchesTheUsualScopesAndLogsItsOwnLine) {
+  store.setValue("key", PropertyList("value"),
+                 {.identifier = "domain", .user = platform::UserScope::kAnyUser});
+  EXPECT_EQ(copy(kCopy), withContent(kCopy, ""));
+  EXPECT_EQ(copy(kCopyApp), withContent(kCopyApp, kXml));
+  EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 96l (mhs2)\n"}}));
+  EXPECT_EQ(memory.regions, 0);
+}
+
+TEST_F(PreferencesProxy, CopyOfAMissingKeyAnswersZeroWithAnEmptyDescriptor) {
+  EXPECT_EQ(copy(kCopy), withContent(kCopy, ""));
+  EXPECT_EQ(copy(kCopyApp), withContent(kCopyApp, ""));
+  EXPECT_TRUE(log.takeLines().empty());
+}
+
+TEST_F(PreferencesProxy, CopyWithADomainOrKeyThatIsNotUtf8Answers5InAShortReply) {
+  for (const std::int32_t id : {kCopy, kCopyApp}) {
+    for (const Bytes& reply : {copy(id, "\xff"), copy(id, "domain", "\xff")}) {
+      EXPECT_EQ(reply.size(), 36U);
+      EXPECT_EQ(Get<std::uint32_t>(reply, 0), 0U) << "no descriptor";
+      EXPECT_EQ(Get<std::int32_t>(reply, 32), 5);
+    }
+  }
+}
+
+TEST_F(PreferencesProxy, CopyOfAValueThatXmlCannotCarryAnswers5) {
+  store.setValue("key", PropertyList("\x01"), {.identifier = "domain"});
+  for (const std::int32_t id : {kCopy, kCopyApp}) {
+    EXPECT_EQ(Get<std::int32_t>(copy(id), 32), 5);
+  }
+  EXPECT_TRUE(log.takeLines().empty());
+}
+
+TEST_F(PreferencesProxy, CopyAnswersTheAllocationsCodeAndLogsTheFailedAllocationToo) {
+  ASSERT_EQ(set(kXml), 0);
+  memory.fails = true;
+  for (const std::int32_t id : {kCopy, kCopyApp}) {
+    const Bytes reply = copy(id);
+    EXPECT_EQ(reply.size(), 36U);
+    EXPECT_EQ(Get<std::int32_t>(reply, 32), KERN_NO_SPACE);
+  }
+  EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 96l (mhs1)\n"},
+                                    {LogPriority::kError, "VM_ALLOCATE 96l (mhs2)\n"}}));
+}
+
+TEST_F(PreferencesProxy, CopyOfALargeValueArrivesInSealedMemory) {
+  store.setValue("key", PropertyList(std::string(300'000, 'v')), {.identifier = "domain"});
+  Bytes bytes = support::Message(kCopy, 544);
+  support::PutText(bytes, 32, "domain");
+  support::PutText(bytes, 288, "key");
+  const support::Packet reply = request(*client, bytes);
+  ASSERT_EQ(reply.descriptors.size(), 1U);
+  EXPECT_EQ(reply.bytes.size(), 56U);
+  std::string content(Get<std::uint32_t>(reply.bytes, 52), '\0');
+  EXPECT_EQ(::pread(reply.descriptors[0].get(), content.data(), content.size(), 0),
+            static_cast<ssize_t>(content.size()));
+  EXPECT_NE(content.find("vvv</string>"), std::string::npos);
+  EXPECT_EQ(memory.regions, 0);
+}
+
+}  // namespace
