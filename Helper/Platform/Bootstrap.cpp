@@ -91,11 +91,12 @@ KernReturn Bind(const std::string& path, PortEntry& entry) {
 
   FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
   if (!socket || !AskForSenders(socket.get())) return CodeOfErrno();
-  // The mode of the unbound socket becomes the mode of the bound one: no moment of wider access.
-  if (::fchmod(socket.get(), S_IRUSR | S_IWUSR | S_IRGRP | S_IWGRP) != 0) return CodeOfErrno();
-  if (::bind(socket.get(), name, sizeof address) != 0) {
-    return errno == EADDRINUSE ? KERN_NO_ACCESS : CodeOfErrno();
-  }
+  // Start-up has one thread, so the mask is nobody else's: mode 0660 from the first moment on.
+  const mode_t mask = ::umask(S_IXUSR | S_IXGRP | S_IRWXO);
+  const bool bound = ::bind(socket.get(), name, sizeof address) == 0;
+  const KernReturn code = errno == EADDRINUSE ? KERN_NO_ACCESS : CodeOfErrno();
+  ::umask(mask);
+  if (!bound) return code;
   entry.boundPath = BoundPath(path);
   entry.receive = std::make_shared<const FileDescriptor>(std::move(socket));
   return KERN_SUCCESS;
