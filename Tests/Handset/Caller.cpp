@@ -115,6 +115,32 @@ std::string AskWho() {
   return socket.answer();
 }
 
+/// Log lines of a writer that does not wait; how many were taken.
+int LogBurst(int count) {
+  const Socket log("/dev/log");
+  int taken = 0;
+  for (int i = 0; i < count; ++i) taken += log.post("line", MSG_DONTWAIT) ? 1 : 0;
+  std::printf("%d\n", taken);
+  return 0;
+}
+
+/// A second question while the first one waits.
+int AskTwice() {
+  const int control = socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0);
+  const sockaddr_un address = AddressOf("/run/handset/control");
+  if (connect(control, reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
+    Fail("connect");
+  }
+  constexpr std::string_view kWait{"wait-start\0", 11};
+  for (int i = 0; i < 2; ++i) {
+    if (send(control, kWait.data(), kWait.size(), MSG_NOSIGNAL) < 0) Fail("ask");
+  }
+  char answer = 0;
+  std::printf("%s\n", recv(control, &answer, 1, 0) == 0 ? "dropped" : "answered");
+  close(control);
+  return 0;
+}
+
 std::string BytesOf(std::string_view hexadecimal) {
   std::string bytes;
   for (std::size_t i = 0; i + 1 < hexadecimal.size(); i += 2) {
@@ -139,6 +165,8 @@ int main(int argc, char** argv) {
   if (verb == "rounds" && words.size() == 2) return Rounds(std::atoi(words[1].c_str()));
   if (verb == "batch" && words.size() == 2) return Batch(std::atoi(words[1].c_str()));
   if (verb == "burst") return Burst();
+  if (verb == "log-burst" && words.size() == 2) return LogBurst(std::atoi(words[1].c_str()));
+  if (verb == "ask-twice") return AskTwice();
   if (verb == "call" && words.size() == 2) {
     std::printf("%s\n", Socket(kPort).call(words[1]).c_str());
     return 0;

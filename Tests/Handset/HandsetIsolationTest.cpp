@@ -109,6 +109,27 @@ TEST_F(HandsetIsolation, LeavesNoMountOnTheHost) {
   EXPECT_EQ(handset::ReadWholeFile("/proc/self/mountinfo"), before);
 }
 
+/// Runs a script of the host in a mount namespace in which it may mount what it likes.
+Outcome RunAsideFromTheHost(const char* propagation, const std::string& script) {
+  return RunProgram(
+      {"/usr/bin/unshare", "--mount", "--propagation", propagation, "sh", "-c", script});
+}
+
+TEST_F(HandsetIsolation, LeavesNoMountOnAHostWhoseMountsAreShared) {
+  const Outcome run = RunAsideFromTheHost(
+      "shared", "before=$(cat /proc/self/mountinfo); " HANDSET " run --helper " FAKE_HELPER
+                " true && [ \"$before\" = \"$(cat /proc/self/mountinfo)\" ] && echo same");
+  EXPECT_EQ(run.output, "same\n") << run.errors;
+}
+
+TEST_F(HandsetIsolation, ShowsWhatTheHostHasMountedBelowALayeredFolder) {
+  const Outcome run = RunAsideFromTheHost(
+      "private", "mount -t tmpfs none /var/cache && touch /var/cache/mounted && " HANDSET
+                 " run --helper " FAKE_HELPER
+                 " sh -c 'ls /var/cache; touch /var/cache/x 2>/dev/null || echo read-only'");
+  EXPECT_EQ(run.output, "mounted\nread-only\n") << run.errors;
+}
+
 TEST_F(HandsetIsolation, EndsEveryProcessWithTheCommand) {
   RunningHandset run(
       "caller post block; handset wait-start >/dev/null; cat /dev/zero >/dev/null &\n"
@@ -133,12 +154,13 @@ TEST_F(HandsetIsolation, EndsEveryProcessWithTheToolEvenWhenThatIsKilled) {
   std::vector<FileDescriptor> inside = HoldDescendants(run.pid());
   ASSERT_GE(inside.size(), 5U);
   ASSERT_EQ(kill(run.pid(), SIGKILL), 0);
-  EXPECT_EQ(run.finish().status, 128 + SIGKILL);
+  // The script's input is still open, so that nothing but the kill can end it. Nobody waits for
+  // these processes any more, so their ends come a moment after the tool's.
   for (const FileDescriptor& process : inside) {
-    // Nobody waits for them any more, so their ends come a moment after the tool's.
     pollfd ended{process.get(), POLLIN, 0};
     EXPECT_EQ(poll(&ended, 1, -1), 1);
   }
+  EXPECT_EQ(run.finish().status, 128 + SIGKILL);
   EXPECT_EQ(handset::ReadWholeFile("/proc/self/mountinfo"), before);
 }
 

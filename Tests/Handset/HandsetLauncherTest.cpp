@@ -1,11 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // The launcher of the handset, with a helper that serves one message per instance. One thread.
+#include <fcntl.h>
 #include <gtest/gtest.h>
 
 #include <string>
 #include <vector>
 
+#include "Helper/Platform/FileDescriptor.h"
 #include "Tests/Handset/HandsetRun.h"
 #include "Tools/handset/Files.h"
 
@@ -31,8 +33,21 @@ TEST_F(Launcher, StartsTheHelperWithTheSendersCredentialsOnTheFirstMessage) {
 }
 
 TEST_F(Launcher, HandsOverTheServicePortAndNothingElse) {
+  // One that the tool's own caller has left open across the start of programs.
+  const platform::FileDescriptor stray(open("/dev/null", O_RDONLY));
+  ASSERT_GE(stray.get(), 3);
   const Outcome run = RunHandset("caller call descriptors");
   EXPECT_EQ(run.output, "0 1 2 3 \n") << run.errors;
+}
+
+TEST_F(Launcher, DoesNotWatchThePortWhileTheHelperRuns) {
+  // What the first process's epoll descriptor watches, as the kernel lists it.
+  const Outcome run = RunHandset(
+      "watched() { cat /proc/1/fdinfo/* | grep -c ^tfd:; }\n"
+      "before=$(watched); caller post block; handset log --follow-until blocking >/dev/null\n"
+      "during=$(watched); handset kill; handset wait-exit >/dev/null; after=$(watched)\n"
+      "echo $((before - during)) $((after - before))");
+  EXPECT_EQ(run.output, "1 0\n") << run.errors;
 }
 
 TEST_F(Launcher, GivesTheHelperAServicesEnvironment) {

@@ -16,6 +16,8 @@
 #include <system_error>
 #include <utility>
 
+#include "Tools/handset/Files.h"
+
 namespace handset_tests {
 namespace {
 
@@ -118,6 +120,10 @@ std::string RunningHandset::nextLine() {
     line += c;
   }
   return "";
+}
+
+void RunningHandset::say(const std::string& line) {
+  ASSERT_TRUE(handset::WriteAll(input_.get(), line + "\n"));
 }
 
 Outcome RunningHandset::finish() {

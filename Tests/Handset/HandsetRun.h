@@ -32,6 +32,8 @@ class RunningHandset {
   [[nodiscard]] pid_t pid() const { return pid_; }
   /// Blocks until the script has written a whole line; that line, or "" at the end of its output.
   [[nodiscard]] std::string nextLine();
+  /// Writes a line to the script's standard input.
+  void say(const std::string& line);
   /// Closes the script's standard input and waits for the end of everything.
   [[nodiscard]] Outcome finish();
 

@@ -70,6 +70,13 @@ TEST_F(Handset, HasItsTwoUsers) {
   EXPECT_EQ(run.errors, "handset: there is no user no-such-user\n");
 }
 
+TEST_F(Handset, TakesAMemberOutOfThePortGroupOnRequest) {
+  const Outcome run = RunHandset(
+      "sed -i 's/^halvec:x:502:/&mobile/' /etc/group\n"
+      "handset as --without-group mobile id -G; handset as mobile id -G");
+  EXPECT_EQ(run.output, "501\n501 502\n");
+}
+
 TEST_F(Handset, RunsTheCommandAsTheUserAsked) {
   const Outcome run = RunHandset("id -un; id -Gn; echo $HOME", {"--user", "mobile"});
   EXPECT_EQ(run.output, "mobile\nmobile halvec\n/var/mobile\n");
@@ -99,8 +106,15 @@ TEST_F(Handset, LetsTheTelephonyDaemonPublishPortsButNotReplaceTheHelpers) {
 }
 
 TEST_F(Handset, AnswersQuestionsOfRootOnly) {
-  const Outcome run = RunHandset("handset as mobile -- handset status; echo $?");
-  EXPECT_EQ(run.output, "125\n");
+  const Outcome run = RunHandset(
+      "handset as mobile -- handset status; echo $?; stat -c '%U %a' /run/handset/control");
+  EXPECT_EQ(run.output, "125\nroot 600\n");
+  EXPECT_EQ(run.errors, "handset: connect to /run/handset/control: Permission denied\n");
+}
+
+TEST_F(Handset, DropsWhoAsksASecondQuestionBeforeTheAnswer) {
+  EXPECT_EQ(RunHandset("caller ask-twice; handset status | head -n 1").output,
+            "dropped\nnot running\n");
 }
 
 TEST_F(Handset, KeepsTheSystemLogByteForByte) {
@@ -148,6 +162,21 @@ TEST_F(Handset, LosesNoLineOfALogBurst) {
   const std::string log = handset::ReadWholeFile(file);
   EXPECT_EQ(std::count(log.begin(), log.end(), '\n'), 2000);
   EXPECT_NE(log.find("\"text\":\"line 1999\""), std::string::npos);
+}
+
+TEST_F(Handset, HoldsTheLogLinesOfAWriterThatDoesNotWaitWhileItIsBusy) {
+  RunningHandset run(
+      "echo ready; read -r line; caller log-burst 200; read -r line\n"
+      "handset log | wc -l");
+  ASSERT_EQ(run.nextLine(), "ready");
+  const std::string id = std::to_string(run.pid());
+  const int first = std::stoi(handset::ReadWholeFile("/proc/" + id + "/task/" + id + "/children"));
+  ASSERT_EQ(kill(first, SIGSTOP), 0);
+  run.say("go");
+  EXPECT_EQ(run.nextLine(), "200");
+  ASSERT_EQ(kill(first, SIGCONT), 0);
+  run.say("go");
+  EXPECT_EQ(run.finish().output, "200\n");
 }
 
 TEST_F(Handset, ShowsLogAndStartsWhenVerbose) {

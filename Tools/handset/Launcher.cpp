@@ -148,23 +148,20 @@ void Launcher::childEnded(pid_t pid, int waitStatus) {
   running_.reset();
   ++exits_;
   last_ = exit;
+  // However it ended: an instance that took its message is no loop, for the message is gone.
+  const bool isUseless = startedFor_ && peekFrontMessage() == startedFor_;
+  uselessExits_ = isUseless ? uselessExits_ + 1 : 0;
+  isStopped_ = uselessExits_ >= kMostUselessExits;
+  if (!isStopped_) watchPort();
   report("exit",
          ",\"pid\":" + std::to_string(pid) + ",\"code\":" + std::to_string(exit.code) +
              ",\"signal\":" + std::to_string(exit.signal) +
              ",\"lived_ms\":" + std::to_string(exit.lived.count()),
          "helper " + std::to_string(pid) + " " + Describe(exit));
-  // However it ended: an instance that took its message is no loop, for the message is gone.
-  const bool isUseless = startedFor_ && peekFrontMessage() == startedFor_;
-  uselessExits_ = isUseless ? uselessExits_ + 1 : 0;
-  if (uselessExits_ < kMostUselessExits) {
-    watchPort();
-  } else {
-    stop();
-  }
+  if (isStopped_) reportStop();
 }
 
-void Launcher::stop() {
-  isStopped_ = true;
+void Launcher::reportStop() {
   const std::string text = "the helper ended " + std::to_string(kMostUselessExits) +
                            " times in a row without serving a message; it is not started any more";
   report("stop", ",\"reason\":" + JsonString(text), text);

@@ -80,7 +80,7 @@ class Launcher {
   void watchPort();
   [[nodiscard]] bool isMessageQueued() const;
   [[nodiscard]] FrontMessage peekFrontMessage() const;
-  void stop();
+  void reportStop();
   void report(const std::string& event, const std::string& fields, const std::string& text);
 
   EventLoop& loop_;

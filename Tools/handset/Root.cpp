@@ -242,7 +242,6 @@ void BuildFolders(const FromHost& host) {
   MountMemory(kInstallDirectory, "755");
   for (const std::string& directory : EntitlementDirectories()) MountMemory(directory, "755");
   MakeDirectories(kControlDirectory);
-  if (chmod(kControlDirectory, 0700) != 0) throw Failure::FromErrno("chmod /run/handset");
 }
 
 }  // namespace
