@@ -1,0 +1,35 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// The commands: one row each, one file each.
+#pragma once
+
+#include <span>
+#include <string_view>
+
+#include "Client/HelperClient.h"
+#include "Tools/halvecctl/CommandLine.h"
+#include "Tools/halvecctl/Exit.h"
+
+namespace halvecctl {
+
+/// A command of the program. `run` prints to standard output, and throws Failure for what main()
+/// shall print to standard error.
+struct Command {
+  std::string_view name;
+  std::string_view arguments;
+  std::string_view summary;
+  std::string_view help;
+  ExitCode (*run)(const GlobalOptions& options, Words words);
+};
+
+extern const Command kListCommand;
+extern const Command kPreferenceCommand;
+extern const Command kCallCommand;
+
+/// Every command, in the order of --help.
+[[nodiscard]] std::span<const Command* const> Commands();
+
+/// A connection as the options ask for it. Throws Failure without one.
+[[nodiscard]] halvec::HelperClient Connect(const GlobalOptions& options);
+
+}  // namespace halvecctl
