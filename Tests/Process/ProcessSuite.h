@@ -19,7 +19,8 @@ class ProcessSuite : public handset_tests::HandsetSuite {
     std::vector<std::string> arguments{HANDSET,     "run",
                                        "--helper",  HELPER,
                                        "--install", CLIENT ":client",
-                                       "--install", HALVECCTL ":halvecctl"};
+                                       "--install", HALVECCTL ":halvecctl",
+                                       "--install", HELPER ":helper"};
     arguments.insert(arguments.end(), options.begin(), options.end());
     arguments.insert(arguments.end(),
                      {"--", "sh", "-c",

@@ -140,7 +140,7 @@ TEST_F(PreferencesProxy, ReadsATextWithoutItsZeroUpToItsLastByteButOne) {
 TEST_F(PreferencesProxy, CopyAnswersTheXmlFormAndLogsTheAllocation) {
   ASSERT_EQ(set(kXml), 0);
   EXPECT_EQ(copy(kCopy), withContent(kCopy, kXml));
-  EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 96l (mhs1)\n"}}));
+  EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 93l (mhs1)\n"}}));
   EXPECT_EQ(memory.regions, 0) << "the region leaves with the reply";
 }
 
@@ -149,7 +149,7 @@ TEST_F(PreferencesProxy, AppCopySearchesTheUsualScopesAndLogsItsOwnLine) {
                  {.identifier = "domain", .user = platform::UserScope::kAnyUser});
   EXPECT_EQ(copy(kCopy), withContent(kCopy, ""));
   EXPECT_EQ(copy(kCopyApp), withContent(kCopyApp, kXml));
-  EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 96l (mhs2)\n"}}));
+  EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 93l (mhs2)\n"}}));
   EXPECT_EQ(memory.regions, 0);
 }
 
@@ -185,8 +185,8 @@ TEST_F(PreferencesProxy, CopyAnswersTheAllocationsCodeAndLogsTheFailedAllocation
     EXPECT_EQ(reply.size(), 36U);
     EXPECT_EQ(Get<std::int32_t>(reply, 32), KERN_NO_SPACE);
   }
-  EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 96l (mhs1)\n"},
-                                    {LogPriority::kError, "VM_ALLOCATE 96l (mhs2)\n"}}));
+  EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 93l (mhs1)\n"},
+                                    {LogPriority::kError, "VM_ALLOCATE 93l (mhs2)\n"}}));
 }
 
 TEST_F(PreferencesProxy, CopyOfALargeValueArrivesInSealedMemory) {
