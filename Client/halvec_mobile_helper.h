@@ -105,8 +105,8 @@ void hvmh_free(void* memory);
 // The requests. Texts are zero-terminated UTF-8 of at most 255 bytes where nothing else is said; a
 // longer one is HVMH_TOO_LARGE. A null text or result pointer is HVMH_INVALID_ARGUMENT. Result
 // texts and data are new memory for hvmh_free(); results are null, 0 or false unless the call
-// answers HVMH_OK. Every request may answer each status except HVMH_REFUSED's causes of a connect,
-// and those as well when HVMH_FLAG_RECONNECT is set.
+// answers HVMH_OK. Any status may come back; HVMH_NOT_RUNNING and HVMH_ACCESS_DENIED only with
+// HVMH_FLAG_RECONNECT.
 
 /// Stores the voicemail token of the default key.
 hvmh_status hvmh_set_voicemail_token(hvmh_client* client, const char* token, hvmh_error* error);
