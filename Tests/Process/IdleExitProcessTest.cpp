@@ -57,11 +57,14 @@ TEST_F(Life, BeginsAnewWithTheNextConnect) {
 }
 
 TEST_F(Life, EndsWithStatus1AndTwoLinesWhenThePortCannotBeCheckedIn) {
-  // Announced, but standard error is no service port; nothing is announced twice.
+  // What the launcher's variables announce is no service port.
   const Outcome outcome =
-      run("names=com.zarvo.halvec.mobile-helper\n"
-          "sh -c 'export LISTEN_PID=$$ LISTEN_FDS=1 LISTEN_FDNAMES='$names'; exec 3</dev/null; "
-          "exec " HELPER "'; echo $?; handset log --json");
+      run("cat >/tmp/start <<'END'\n"
+          "export LISTEN_PID=$$ LISTEN_FDS=1 LISTEN_FDNAMES=com.zarvo.halvec.mobile-helper\n"
+          "exec 3</dev/null\n"
+          "exec /usr/libexec/halvec/helper\n"
+          "END\n"
+          "sh /tmp/start; echo $?; handset log --json");
   EXPECT_TRUE(outcome.output.starts_with("1\n")) << outcome.output << outcome.errors;
   const std::size_t first =
       outcome.output.find("\"unable to create server objects - out of resources\"");
