@@ -14,8 +14,11 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
+#include <fstream>
 #include <string>
 #include <string_view>
+#include <system_error>
 
 namespace {
 
@@ -86,6 +89,20 @@ void WriteLog() {
   syslog(LOG_NOTICE, "%s", "two: colons: no newline");
 }
 
+/// True for the first `count` instances that ask: they are to leave their message where it is.
+bool IsTooEarly(int count) {
+  constexpr const char* kMarks = "/run/fake-helper-instances";
+  std::error_code error;
+  std::uintmax_t before = std::filesystem::file_size(kMarks, error);
+  if (error) before = 0;
+  if (before >= static_cast<std::uintmax_t>(count)) {
+    std::filesystem::remove(kMarks, error);
+    return false;
+  }
+  std::ofstream(kMarks, std::ios::app) << '.';
+  return true;
+}
+
 struct Request {
   std::string text;
   sockaddr_un sender{};
@@ -93,7 +110,7 @@ struct Request {
   std::string credentials = "none";
 };
 
-bool Receive(Request& request) {
+bool Receive(Request& request, int flags) {
   std::array<char, 4096> text{};
   alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(ucred))> control{};
   iovec vector{text.data(), text.size()};
@@ -104,7 +121,7 @@ bool Receive(Request& request) {
   message.msg_iovlen = 1;
   message.msg_control = control.data();
   message.msg_controllen = control.size();
-  const ssize_t count = recvmsg(kPort, &message, 0);
+  const ssize_t count = recvmsg(kPort, &message, flags);
   if (count < 0) return false;
   request.senderLength = message.msg_namelen;
   request.text.assign(text.data(), static_cast<std::size_t>(count));
@@ -124,7 +141,11 @@ int main() {
   const int wrong = CheckHandOver();
   if (wrong != 0) return wrong;
   Request request;
-  if (!Receive(request)) return Complain("nothing to read", 70);
+  if (!Receive(request, MSG_PEEK)) return Complain("nothing to look at", 72);
+  if (request.text.starts_with("late ") && IsTooEarly(std::atoi(request.text.c_str() + 5))) {
+    return 1;
+  }
+  if (!Receive(request, 0)) return Complain("nothing to read", 70);
   const std::string_view text = request.text;
   std::string reply;
   if (text == "who") {
@@ -141,6 +162,8 @@ int main() {
     pause();
   } else if (text == "abort") {
     raise(SIGABRT);
+  } else if (text.starts_with("late ")) {
+    return 0;
   } else if (text.starts_with("exit ")) {
     return std::atoi(request.text.c_str() + 5);
   } else {

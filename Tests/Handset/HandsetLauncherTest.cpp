@@ -34,20 +34,22 @@ TEST_F(Launcher, StartsTheHelperWithTheSendersCredentialsOnTheFirstMessage) {
 
 TEST_F(Launcher, HandsOverTheServicePortAndNothingElse) {
   // One that the tool's own caller has left open across the start of programs.
-  const platform::FileDescriptor stray(open("/dev/null", O_RDONLY));
-  ASSERT_GE(stray.get(), 3);
+  const platform::FileDescriptor nothing(open("/dev/null", O_RDONLY | O_CLOEXEC));
+  const platform::FileDescriptor stray(fcntl(nothing.get(), F_DUPFD, 20));
+  ASSERT_GE(stray.get(), 20);
   const Outcome run = RunHandset("caller call descriptors");
   EXPECT_EQ(run.output, "0 1 2 3 \n") << run.errors;
 }
 
 TEST_F(Launcher, DoesNotWatchThePortWhileTheHelperRuns) {
-  // What the first process's epoll descriptor watches, as the kernel lists it.
+  // The kernel lists what the first process's epoll descriptor watches, with inode numbers.
   const Outcome run = RunHandset(
-      "watched() { cat /proc/1/fdinfo/* | grep -c ^tfd:; }\n"
-      "before=$(watched); caller post block; handset log --follow-until blocking >/dev/null\n"
-      "during=$(watched); handset kill; handset wait-exit >/dev/null; after=$(watched)\n"
-      "echo $((before - during)) $((after - before))");
-  EXPECT_EQ(run.output, "1 0\n") << run.errors;
+      "port=$(printf 'ino:%x ' $(grep com.zarvo.halvec.mobile-helper /proc/net/unix |"
+      " (read -r a b c d e f inode rest; echo $inode)))\n"
+      "watched() { cat /proc/1/fdinfo/* | grep ^tfd: | grep -c \"$port\"; }\n"
+      "watched; caller post block; handset log --follow-until blocking >/dev/null; watched\n"
+      "handset kill; handset wait-exit >/dev/null; watched");
+  EXPECT_EQ(run.output, "1\n0\n1\n") << run.errors;
 }
 
 TEST_F(Launcher, GivesTheHelperAServicesEnvironment) {
@@ -113,9 +115,19 @@ TEST_F(Launcher, TakesAHelperThatEndsWellWithoutReadingForACrashLoopToo) {
       << run.output;
 }
 
+TEST_F(Launcher, CountsOnlyInstancesInARowForACrashLoop) {
+  const Outcome run = RunHandset(
+      "caller post 'late 9'; caller post 'late 9'\n"
+      "handset wait-exit --exits 20 >/dev/null; handset status --json");
+  EXPECT_NE(run.output.find("\"starts\":20,\"exits\":20,\"stopped\":false,"
+                            "\"message_queued\":false"),
+            std::string::npos)
+      << run.output;
+}
+
 TEST_F(Launcher, DoesNotTakeHelpersThatServeAndFailForACrashLoop) {
   const Outcome run = RunHandset(
-      "for i in 1 2 3 4 5 6 7 8 9 10 11 12 13 14 15; do caller post 'exit 1'; done\n"
+      "for i in 1 2 3 4 5 6 7 8 9 10 11 12 13 14 15; do caller post \"exit $i\"; done\n"
       "handset wait-exit --exits 15 >/dev/null; handset status --json");
   EXPECT_NE(run.output.find("\"starts\":15,\"exits\":15,\"stopped\":false"), std::string::npos)
       << run.output;
