@@ -113,6 +113,8 @@ PreferenceFileContents ReadPreferenceFile(const std::string& path) {
   struct stat status {};
   if (::stat(path.c_str(), &status) != 0) {
     if (errno == ENOENT || errno == ENOTDIR) return contents;
+    // Symbolic links in a circle: no file, but something that stands in its place.
+    if (errno == ELOOP) return fail(State::kCorrupt, Describe("stat", errno));
     return fail(State::kUnreadable, Describe("stat", errno));
   }
   contents.stamp = StampOf(status);

@@ -9,6 +9,7 @@
 #include <chrono>
 #include <map>
 #include <mutex>
+#include <optional>
 #include <string>
 
 #include "Helper/Platform/Linux/PreferenceFile.h"
@@ -62,7 +63,7 @@ class PreferenceFiles final : public PreferencesStore {
     // The state of the file that is known to survive a power cut.
     PreferenceFileStamp durable;
     // The state of the file whose defect is in the log already.
-    PreferenceFileStamp reported;
+    std::optional<PreferenceFileStamp> reported;
     // Changes not yet written; none removes the key.
     std::map<std::string, std::optional<PropertyList>, std::less<>> pending;
   };
