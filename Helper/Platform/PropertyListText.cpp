@@ -203,7 +203,8 @@ std::optional<PropertyList::Date> ParseDate(std::string_view text) noexcept {
                                          std::chrono::day{static_cast<unsigned>(day)}};
   if (!date.ok()) return std::nullopt;
   const std::int64_t days = (std::chrono::sys_days{date} - kEpoch).count();
-  const std::int64_t seconds = days * kSecondsPerDay + hour * 3600 + minute * 60 + second;
+  const std::int64_t seconds =
+      days * kSecondsPerDay + hour * std::int64_t{3600} + minute * std::int64_t{60} + second;
   return PropertyList::Date{static_cast<double>(seconds)};
 }
 
