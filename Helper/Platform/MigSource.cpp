@@ -27,7 +27,16 @@ KernReturn CodeOfReply(const std::byte* reply) {
 }  // namespace
 
 struct MigRunLoopSource::Watch : DescriptorWatch {
-  Watch(RunLoop& runLoop) : DescriptorWatch(runLoop), loop(runLoop) {}
+  Watch(RunLoop& runLoop, MigRunLoopSource& source)
+      : DescriptorWatch(
+            runLoop,
+            [](void* context) {
+              // A routine may give the source up while it runs.
+              const auto keep = static_cast<MigRunLoopSource*>(context)->shared_from_this();
+              keep->serveOne();
+            },
+            &source),
+        loop(runLoop) {}
   RunLoop& loop;
 };
 
@@ -56,22 +65,15 @@ MigRunLoopSource::~MigRunLoopSource() { invalidate(); }
 
 bool MigRunLoopSource::addTo(RunLoop& loop) {
   if (!valid_ || watch_) return false;
-  auto watch = std::make_unique<Watch>(loop);
+  auto watch = std::make_unique<Watch>(loop, *this);
   if (!watch->open(socket_->get())) return false;
   watch_ = std::move(watch);
-  wait();
   return true;
 }
 
 void MigRunLoopSource::invalidate() {
   valid_ = false;
   watch_.reset();
-}
-
-void MigRunLoopSource::wait() {
-  watch_->wait([weak = weak_from_this()] {
-    if (const auto source = weak.lock(); source && source->valid_) source->serveOne();
-  });
 }
 
 void MigRunLoopSource::serveOne() {
@@ -84,7 +86,7 @@ void MigRunLoopSource::serveOne() {
     watch_.reset();
     return;
   }
-  if (status == ReceiveStatus::kNothing) return wait();
+  if (status == ReceiveStatus::kNothing) return;
 
   alignas(std::max_align_t) std::array<std::byte, kMaxReplySize> reply;
   const wire::MessageHeader header = request.header();
@@ -109,7 +111,6 @@ void MigRunLoopSource::serveOne() {
   }
   request.clear();
   loop.noteHandledSource();
-  if (watch_) wait();
 }
 
 }  // namespace platform

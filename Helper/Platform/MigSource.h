@@ -63,7 +63,6 @@ class MigRunLoopSource : public std::enable_shared_from_this<MigRunLoopSource> {
   struct Watch;
   MigRunLoopSource(PortName port, SharedDescriptor socket, bool named,
                    const MigSubsystem& subsystem);
-  void wait();
   void serveOne();
 
   const PortName port_;

@@ -11,7 +11,10 @@
 namespace platform {
 
 struct PortWatcher::Watches {
-  explicit Watches(RunLoop& loop) : socket(loop), holder(loop) {}
+  Watches(RunLoop& loop, PortWatcher* watcher)
+      : socket(loop, End, watcher), holder(loop, End, watcher) {}
+  /// Whatever is heard of either descriptor is the port's end.
+  static void End(void* watcher) { static_cast<PortWatcher*>(watcher)->invalidate(); }
   DescriptorWatch socket;
   DescriptorWatch holder;
 };
@@ -22,15 +25,9 @@ std::shared_ptr<PortWatcher> PortWatcher::Create(PortName port, void* info) {
   if (!socket || !rights || rights->sendReferences == 0) return nullptr;
   auto watcher = std::shared_ptr<PortWatcher>(
       new PortWatcher(port, info, std::move(socket), PortHolder(port)));
-  auto watches = std::make_unique<Watches>(RunLoop::Current());
+  auto watches = std::make_unique<Watches>(RunLoop::Current(), watcher.get());
   if (!watches->socket.open(watcher->socket_->get())) return nullptr;
   if (watcher->holder_ && !watches->holder.open(watcher->holder_->get())) return nullptr;
-  // Whatever is heard of either descriptor is the port's end, so neither is waited for again.
-  const auto end = [weak = watcher->weak_from_this()] {
-    if (const auto self = weak.lock()) self->invalidate();
-  };
-  watches->socket.wait(end);
-  if (watcher->holder_) watches->holder.wait(end);
   watcher->watches_ = std::move(watches);
   return watcher;
 }

@@ -1,7 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Helper/Platform/RunLoop.h"
 
-#include <asio/post.hpp>
+#include <sys/eventfd.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <climits>
 #include <utility>
 
 #include "Helper/Platform/RunLoopCore.h"
@@ -13,6 +17,15 @@ namespace {
 constexpr double kForeverSeconds = 100.0 * 366 * 86400;
 
 thread_local RunLoop* currentLoop = nullptr;
+
+/// As epoll_wait takes it: -1 waits for as long as nothing happens. Rounded up, so that a loop does
+/// not spin through the last millisecond.
+int MillisecondsUntil(TimePoint time) {
+  if (time == TimePoint::max()) return -1;
+  const auto left =
+      std::chrono::ceil<std::chrono::milliseconds>(time - std::chrono::steady_clock::now());
+  return static_cast<int>(std::clamp<std::int64_t>(left.count(), 0, INT_MAX));
+}
 
 class MonotonicClock final : public Clock {
  public:
@@ -35,6 +48,75 @@ std::shared_ptr<RunLoopTimer> RunLoopTimer::Create(RunLoop& loop, TimePoint fire
 }
 
 void RunLoopTimer::invalidate() { loop_.remove(*this); }
+
+DescriptorWatch::DescriptorWatch(RunLoop& loop, Handler handler, void* context)
+    : loop_(loop), handler_(handler), context_(context) {}
+
+bool DescriptorWatch::open(int descriptor) {
+  epoll_event event{.events = EPOLLIN, .data = {.ptr = this}};
+  if (::epoll_ctl(loop_.core().epoll.get(), EPOLL_CTL_ADD, descriptor, &event) != 0) return false;
+  descriptor_ = descriptor;
+  return true;
+}
+
+void DescriptorWatch::cancel() {
+  const int descriptor = std::exchange(descriptor_, -1);
+  if (descriptor < 0) return;
+  RunLoop::Core& core = loop_.core();
+  (void)::epoll_ctl(core.epoll.get(), EPOLL_CTL_DEL, descriptor, nullptr);
+  for (std::size_t index = core.nextReady; index < core.readyCount; ++index) {
+    if (core.ready[index].data.ptr == this) core.ready[index].data.ptr = nullptr;
+  }
+}
+
+RunLoop::Core::Core(Clock& loopClock)
+    : clock(loopClock),
+      epoll(::epoll_create1(EPOLL_CLOEXEC)),
+      wakeUp(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
+  // A loop that did not get its two descriptors watches nothing: whoever opens a watch is told.
+  epoll_event event{.events = EPOLLIN, .data = {.ptr = this}};
+  (void)::epoll_ctl(epoll.get(), EPOLL_CTL_ADD, wakeUp.get(), &event);
+}
+
+void RunLoop::Core::collect(int milliseconds) {
+  if (nextReady < readyCount) return;
+  nextReady = 0;
+  const int count =
+      ::epoll_wait(epoll.get(), ready.data(), static_cast<int>(ready.size()), milliseconds);
+  readyCount = count > 0 ? static_cast<std::size_t>(count) : 0;
+}
+
+bool RunLoop::Core::serveOne() {
+  while (nextReady < readyCount) {
+    void* const entry = ready[nextReady++].data.ptr;
+    if (!entry) continue;  // cancelled since
+    if (entry != this) {
+      auto* watch = static_cast<DescriptorWatch*>(entry);
+      watch->handler_(watch->context_);
+      return true;
+    }
+    std::function<void()> work;
+    {
+      const std::lock_guard guard(mutex);
+      if (!posted.empty()) {
+        work = std::move(posted.front());
+        posted.pop_front();
+      }
+      if (posted.empty()) {
+        std::uint64_t count = 0;
+        (void)!::read(wakeUp.get(), &count, sizeof count);  // empty already: nothing to take back
+      }
+    }
+    if (work) work();
+    return true;
+  }
+  return false;
+}
+
+void RunLoop::Core::wake() const {
+  const std::uint64_t one = 1;
+  (void)!::write(wakeUp.get(), &one, sizeof one);  // full: the loop is awake in any case
+}
 
 RunLoop::RunLoop(Clock& clock) : core_(std::make_unique<Core>(clock)) {}
 
@@ -59,21 +141,27 @@ RunResult RunLoop::run(double seconds) {
       forever ? TimePoint::max()
               : std::chrono::steady_clock::now() +
                     std::chrono::duration_cast<Duration>(std::chrono::duration<double>(seconds));
-  // The loop outlives moments without any source: it waits for posted work and timers then.
-  const auto work = asio::make_work_guard(core_->context);
   core_->handledSource = false;
   for (;;) {
-    core_->context.restart();
-    fireDueTimers();
+    TimePoint firstTimer = TimePoint::max();
     {
       const std::lock_guard guard(core_->mutex);
       if (std::exchange(core_->stopRequested, false)) return RunResult::kStopped;
+      if (!core_->timers.empty()) firstTimer = core_->timers.begin()->first;
     }
-    const std::size_t ran = forever          ? core_->context.run_one()
-                            : seconds <= 0.0 ? core_->context.poll_one()
-                                             : core_->context.run_one_until(deadline);
+    if (firstTimer != TimePoint::max()) {
+      if (firstTimer <= core_->clock.now()) {
+        fireDueTimers();
+        continue;  // one of them may have ended the run
+      }
+      if (!core_->clock.passes()) firstTimer = TimePoint::max();
+    }
+    core_->collect(MillisecondsUntil(std::min(firstTimer, deadline)));
+    const bool served = core_->serveOne();
     if (core_->handledSource) return RunResult::kHandledSource;
-    if (ran == 0 && !core_->context.stopped()) return RunResult::kTimedOut;
+    if (!served && !forever && std::chrono::steady_clock::now() >= deadline) {
+      return RunResult::kTimedOut;
+    }
   }
 }
 
@@ -82,15 +170,24 @@ void RunLoop::stop() {
     const std::lock_guard guard(core_->mutex);
     core_->stopRequested = true;
   }
-  core_->context.stop();
+  core_->wake();
 }
 
-void RunLoop::post(std::function<void()> work) { asio::post(core_->context, std::move(work)); }
+void RunLoop::post(std::function<void()> work) {
+  {
+    const std::lock_guard guard(core_->mutex);
+    core_->posted.push_back(std::move(work));
+  }
+  core_->wake();
+}
 
 void RunLoop::add(const std::shared_ptr<RunLoopTimer>& timer) {
-  const std::lock_guard guard(core_->mutex);
-  core_->timers.emplace(timer->fireDate(), timer);
-  armDriver();
+  {
+    const std::lock_guard guard(core_->mutex);
+    core_->timers.emplace(timer->fireDate(), timer);
+    if (core_->timers.begin()->second != timer) return;
+  }
+  core_->wake();  // the loop may be asleep until a later date
 }
 
 TimePoint RunLoop::now() const { return core_->clock.now(); }
@@ -122,21 +219,6 @@ void RunLoop::fireDueTimers() {
     }
     due->callback_(due.get(), due->context_);
   }
-}
-
-/// With the lock held. The driver only wakes the loop, which then looks for itself what is due: a
-/// driver that fires although its timer has been taken back does no harm.
-void RunLoop::armDriver() {
-  if (core_->timers.empty() || !core_->clock.passes()) return;
-  const TimePoint first = core_->timers.begin()->first;
-  if (core_->driver.expiry() == first) return;
-  core_->driver.expires_at(first);
-  core_->driver.async_wait([this](const asio::error_code& error) {
-    if (error) return;
-    fireDueTimers();
-    const std::lock_guard guard(core_->mutex);
-    armDriver();
-  });
 }
 
 }  // namespace platform

@@ -77,7 +77,6 @@ class RunLoop {
   friend class ScopedCurrentRunLoop;
   void remove(const RunLoopTimer& timer);
   void fireDueTimers();
-  void armDriver();
 
   std::unique_ptr<Core> core_;
 };

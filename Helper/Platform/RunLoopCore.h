@@ -1,63 +1,75 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // The event machinery behind RunLoop, for the files that implement sources. Nothing above this
-// folder sees it.
+// folder sees it. One epoll instance, level-triggered: a descriptor is registered once and costs no
+// further call per event, however often it becomes ready.
 #pragma once
 
-#include <asio/io_context.hpp>
-#include <asio/posix/stream_descriptor.hpp>
-#include <asio/steady_timer.hpp>
+#include <sys/epoll.h>
+
+#include <array>
+#include <deque>
+#include <functional>
 #include <map>
 #include <memory>
 #include <mutex>
 
+#include "Helper/Platform/FileDescriptor.h"
 #include "Helper/Platform/RunLoop.h"
 
 namespace platform {
 
-struct RunLoop::Core {
-  explicit Core(Clock& loopClock) : clock(loopClock), driver(context) {}
-
-  Clock& clock;
-  asio::io_context context;
-  asio::steady_timer driver;   // wakes the loop for the earliest timer; used under `mutex`
-  bool handledSource = false;  // the loop's thread only
-
-  std::mutex mutex;
-  bool stopRequested = false;
-  std::multimap<TimePoint, std::shared_ptr<RunLoopTimer>> timers;
-};
-
-/// Watches one descriptor, which stays its owner's, until it is cancelled. The loop's thread only.
+/// Watches one descriptor, which stays its owner's, from open() until it is cancelled. The loop's
+/// thread only.
 class DescriptorWatch {
  public:
-  explicit DescriptorWatch(RunLoop& loop) : descriptor_(loop.core().context) {}
+  using Handler = void (*)(void* context);
+
+  /// `handler` runs each time the loop finds the descriptor readable or hung up. It may cancel or
+  /// destroy this watch.
+  DescriptorWatch(RunLoop& loop, Handler handler, void* context);
   ~DescriptorWatch() { cancel(); }
   DescriptorWatch(const DescriptorWatch&) = delete;
   DescriptorWatch& operator=(const DescriptorWatch&) = delete;
 
   /// False when the descriptor cannot be watched.
-  [[nodiscard]] bool open(int descriptor) {
-    asio::error_code error;
-    descriptor_.assign(descriptor, error);
-    return !error;
-  }
-
-  /// Calls `handler` once when the descriptor is readable or hung up; not after cancel().
-  template <class Handler>
-  void wait(Handler handler) {
-    descriptor_.async_wait(asio::posix::descriptor_base::wait_read,
-                           [handler = std::move(handler)](const asio::error_code& error) mutable {
-                             if (!error) handler();
-                           });
-  }
-
-  void cancel() {
-    if (descriptor_.is_open()) (void)descriptor_.release();
-  }
+  [[nodiscard]] bool open(int descriptor);
+  void cancel();
 
  private:
-  asio::posix::stream_descriptor descriptor_;
+  friend class RunLoop;
+  RunLoop& loop_;
+  const Handler handler_;
+  void* const context_;
+  int descriptor_ = -1;
+};
+
+struct RunLoop::Core {
+  explicit Core(Clock& loopClock);
+
+  /// Waits until something is ready (`milliseconds` as epoll_wait takes them) unless something
+  /// still is from the last time.
+  void collect(int milliseconds);
+  /// Serves one ready descriptor or one piece of posted work. False when there is none.
+  bool serveOne();
+  /// Interrupts a wait. Any thread.
+  void wake() const;
+
+  Clock& clock;
+  FileDescriptor epoll;
+  FileDescriptor wakeUp;       // an event counter: readable when another thread wants the loop
+  bool handledSource = false;  // the loop's thread only
+
+  // Ready descriptors that have not been served yet; the loop's thread only. A watch that is
+  // cancelled takes itself out.
+  std::array<epoll_event, 64> ready;
+  std::size_t nextReady = 0;
+  std::size_t readyCount = 0;
+
+  std::mutex mutex;
+  bool stopRequested = false;
+  std::deque<std::function<void()>> posted;
+  std::multimap<TimePoint, std::shared_ptr<RunLoopTimer>> timers;
 };
 
 }  // namespace platform
