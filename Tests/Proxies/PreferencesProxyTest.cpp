@@ -71,7 +71,7 @@ class PreferencesProxy : public support::ServerFixture {
     return request(*client, bytes).bytes;
   }
   static Bytes withContent(std::int32_t id, const std::string& content) {
-    Bytes reply(56);
+    Bytes reply(56 + content.size());
     Put(reply, 0, 0x80000000U);
     Put(reply, 4, 56U);
     Put(reply, 20, id + 100);
@@ -82,7 +82,7 @@ class PreferencesProxy : public support::ServerFixture {
     Put(reply, 40, static_cast<std::uint32_t>(content.size()));
     reply[48] = 1;
     Put(reply, 52, static_cast<std::uint32_t>(content.size()));
-    reply.insert(reply.end(), content.begin(), content.end());
+    support::PutText(reply, 56, content);
     return reply;
   }
   std::optional<PropertyList> stored() { return store.copyValue("key", {.identifier = "domain"}); }
