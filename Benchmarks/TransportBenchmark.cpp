@@ -42,6 +42,9 @@ int main(int count, char** arguments) {
     report.add(bench::MeasureRoundTrips(placement, 1, {rounds, 400}));
     report.add(bench::MeasureRoundTrips(placement, 8, {rounds, 800}));
     report.add(bench::MeasureRoundTrips(placement, 64, {rounds, 1280}));
+    report.add(bench::MeasureFreshConnects(placement, {rounds, 20}));
+    report.add(bench::MeasureOutOfLine(placement, {rounds / 3, 200}));
+    report.add(bench::MeasureBesideSilentClients(placement, {rounds * 20, 1}));
   }
   report.finish();
   return 0;

@@ -74,9 +74,15 @@ FileDescriptor BindService(const std::string& path) {
 }
 
 bool SendWithDescriptors(int socket, std::span<const std::span<const std::byte>> parts,
-                         std::span<const int> descriptors) {
+                         std::span<const int> descriptors, const std::string& path) {
   std::array<iovec, 2> vectors{};
   msghdr message{};
+  sockaddr_un address{};
+  if (!path.empty()) {
+    address = Address(path);
+    message.msg_name = &address;
+    message.msg_namelen = sizeof address;
+  }
   message.msg_iov = vectors.data();
   for (const auto part : parts) {
     vectors[message.msg_iovlen++] = {.iov_base = const_cast<std::byte*>(part.data()),
@@ -125,12 +131,9 @@ PendingConnect SendConnect(const std::string& servicePath) {
   Put(message, 38, std::uint16_t{0x0011});
   const FileDescriptor sender(Check(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0), "socket"));
   AttestSender(sender.get());
-  const sockaddr_un address = Address(servicePath);
-  Check(::connect(sender.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address),
-        "connect");
   const std::array<std::span<const std::byte>, 1> parts{message};
   const std::array<int, 2> rights{reply.second.get(), client.second.get()};
-  if (!SendWithDescriptors(sender.get(), parts, rights)) Fail("sending the connect");
+  if (!SendWithDescriptors(sender.get(), parts, rights, servicePath)) Fail("sending the connect");
   return {std::move(client.first), std::move(reply.first)};
 }
 

@@ -58,9 +58,10 @@ std::int32_t SetPreference(const FileDescriptor& port, const std::string& domain
 /// A memfd that holds `bytes` and can be changed by nobody any more.
 [[nodiscard]] FileDescriptor SealedMemory(std::span<const std::byte> bytes);
 
-/// Sends `bytes` with at most one descriptor; false when the socket refuses.
+/// Sends one packet with at most two descriptors, to the socket bound at `path` unless that is
+/// empty. False when the socket refuses.
 bool SendWithDescriptors(int socket, std::span<const std::span<const std::byte>> parts,
-                         std::span<const int> descriptors);
+                         std::span<const int> descriptors, const std::string& path = {});
 /// Receives one packet with at most one descriptor.
 std::size_t ReceiveWithDescriptor(int socket, std::span<std::byte> bytes, FileDescriptor& received);
 

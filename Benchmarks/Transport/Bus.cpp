@@ -208,20 +208,21 @@ void ServeListener(int listener) {
   (void)sd_event_loop(event.get());
 }
 
-class BusConnects final : public Driver {
+class BusConnector final : public Connector {
  public:
-  BusConnects(Child server, std::string address)
+  BusConnector(Child server, std::string address)
       : server_(std::move(server)), address_(std::move(address)) {}
-  void run(std::size_t calls) override {
-    for (std::size_t call = 0; call < calls; ++call) {
-      if (!CallOnce(OpenAddress(address_, false).get(), nullptr, text_)) Fail("first call");
-    }
+  void open() override {
+    bus_ = OpenAddress(address_, false);
+    if (!CallOnce(bus_.get(), nullptr, text_)) Fail("first call");
   }
+  void close() override { bus_.reset(); }
 
  private:
   Child server_;
   const std::string address_;
   const std::string text_ = std::string(255, 't');
+  BusPointer bus_;
 };
 
 std::unique_ptr<Driver> StartPeerToPeer(const Placement& placement, std::size_t connections) {
@@ -255,11 +256,11 @@ std::unique_ptr<Driver> StartBus(const Placement& placement, std::size_t connect
                                      std::move(buses), kServerName);
 }
 
-std::unique_ptr<Driver> StartBusConnects(const Placement& placement, std::string& /*reason*/) {
+std::unique_ptr<Connector> StartBusConnector(const Placement& placement, std::string& /*reason*/) {
   const std::string path = "/tmp/halvec-benchmark-bus-" + std::to_string(::getpid());
   const FileDescriptor listener = ListenAt(path);
   Child server(placement.server, [&] { ServeListener(listener.get()); });
-  return std::make_unique<BusConnects>(std::move(server), "unix:path=" + path);
+  return std::make_unique<BusConnector>(std::move(server), "unix:path=" + path);
 }
 
 }  // namespace bench

@@ -11,7 +11,7 @@ std::unique_ptr<Driver> StartBus(const Placement& /*placement*/, std::size_t /*c
   return nullptr;
 }
 
-std::unique_ptr<Driver> StartBusConnects(const Placement& /*placement*/, std::string& reason) {
+std::unique_ptr<Connector> StartBusConnector(const Placement& /*placement*/, std::string& reason) {
   reason = "built without libsystemd (package libsystemd-dev)";
   return nullptr;
 }

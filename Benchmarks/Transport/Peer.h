@@ -78,8 +78,15 @@ enum class Bus { kPeerToPeer, kDaemon, kBroker };
 [[nodiscard]] std::unique_ptr<Driver> StartBus(const Placement& placement, std::size_t connections,
                                                Bus bus, std::string& reason);
 
-/// Fresh connections: opens one, makes one call, closes it.
-[[nodiscard]] std::unique_ptr<Driver> StartBusConnects(const Placement& placement,
-                                                       std::string& reason);
+/// Makes one fresh connection after the other.
+class Connector {
+ public:
+  virtual ~Connector() = default;
+  /// Connects from nothing and makes one call.
+  virtual void open() = 0;
+  virtual void close() = 0;
+};
+[[nodiscard]] std::unique_ptr<Connector> StartBusConnector(const Placement& placement,
+                                                           std::string& reason);
 
 }  // namespace bench
