@@ -1,0 +1,78 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// Feeds packets to a private port and to a service port, as a client could send them: the port
+// layer, every stub and the preferences proxy. The first byte picks the port and whether
+// descriptors come along; the rest is the packet. Whatever arrives, every name and descriptor must
+// be given back.
+#include <fcntl.h>
+#include <sys/mman.h>
+#include <sys/socket.h>
+
+#include <cstdlib>
+#include <memory>
+
+#include "Helper/Platform/PortMessage.h"
+#include "Helper/Shared/Server/ConnectSubsystem.h"
+#include "Helper/Shared/Server/RequestCatalogue.h"
+#include "Tests/Fakes/FakeCallerSecurity.h"
+#include "Tests/Fakes/FakePreferencesStore.h"
+#include "Tests/Fakes/FakeSystemLog.h"
+#include "Tests/Support/WireClient.h"
+
+namespace {
+
+struct Bench {
+  fakes::FakeSystemLog log;
+  platform::ScopedReplacement<platform::SystemLog> logReplacement{log};
+  fakes::FakeCallerSecurity security;  // nobody is entitled: connects end before a server is needed
+  platform::ScopedReplacement<platform::CallerSecurity> securityReplacement{security};
+  fakes::FakePreferencesStore store;
+  platform::ScopedReplacement<platform::PreferencesStore> storeReplacement{store};
+  platform::ReceiveBuffer buffer;
+  PortName port = kPortNull;
+
+  Bench() { (void)platform::PortAllocate(port); }
+
+  void deliver(const support::Bytes& packet, bool named, const std::vector<int>& descriptors) {
+    const auto sender = platform::PortSendDescriptor(port);
+    const auto receiver = platform::PortReceiveDescriptor(port);
+    if (support::SendPacket(sender->get(), packet, descriptors) != 0) return;
+    if (buffer.receive(port, receiver->get(), named) == platform::ReceiveStatus::kMessage) {
+      const platform::MigSubsystem& subsystem = named ? ConnectSubsystem() : RequestSubsystem();
+      alignas(16) std::array<std::byte, platform::kMaxReplySize> reply;
+      const wire::MessageHeader header = buffer.header();
+      platform::PrepareReply(header, reply.data(), subsystem.maxReplySize);
+      if (const platform::MigStub stub = subsystem.demultiplex(header)) {
+        stub(buffer.message(), reply.data());
+      }
+      (void)platform::SendMessage(receiver->get(), reply.data());
+    }
+    buffer.clear();
+    while (!support::ReceivePacket(sender->get()).bytes.empty()) {
+    }
+    (void)log.takeLines();
+  }
+};
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  static auto* bench = new Bench;
+  if (size == 0) return 0;
+  const std::uint8_t choice = data[0];
+  const support::Bytes packet(data + 1, data + size);
+  const std::size_t names = platform::PortNameCount();
+  const std::size_t open = support::OpenDescriptors();
+  {
+    const support::PortPair right = support::MakePort();
+    const support::FileDescriptor memory(::memfd_create("fuzz", MFD_CLOEXEC | MFD_ALLOW_SEALING));
+    if (::ftruncate(memory.get(), choice & 0x3f) != 0) std::abort();
+    (void)::fcntl(memory.get(), F_ADD_SEALS, F_SEAL_SHRINK | F_SEAL_GROW | F_SEAL_WRITE);
+    std::vector<int> descriptors;
+    if ((choice & 0x40) != 0) descriptors.push_back(right.send.get());
+    if ((choice & 0x20) != 0) descriptors.push_back(memory.get());
+    bench->deliver(packet, (choice & 0x80) != 0, descriptors);
+  }
+  if (platform::PortNameCount() != names || support::OpenDescriptors() != open) std::abort();
+  return 0;
+}
