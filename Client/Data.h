@@ -6,6 +6,7 @@
 
 #include <cstddef>
 #include <cstdlib>
+#include <memory>
 #include <span>
 #include <string_view>
 #include <utility>
@@ -17,39 +18,41 @@ class Data {
  public:
   Data() = default;
   Data(Data&& other) noexcept
-      : bytes_(std::exchange(other.bytes_, nullptr)), size_(std::exchange(other.size_, 0)) {}
+      : bytes_(std::move(other.bytes_)), size_(std::exchange(other.size_, 0)) {}
   Data& operator=(Data&& other) noexcept {
-    std::swap(bytes_, other.bytes_);
-    std::swap(size_, other.size_);
+    bytes_ = std::move(other.bytes_);
+    size_ = std::exchange(other.size_, 0);
     return *this;
   }
-  ~Data() { std::free(bytes_); }
+  ~Data() = default;
 
   /// Makes this a block of `size` bytes of unspecified content. False, and empty, without memory.
   [[nodiscard]] bool allocate(std::size_t size) noexcept {
-    std::free(bytes_);
-    bytes_ = size == 0 ? nullptr : static_cast<std::byte*>(std::malloc(size));
+    bytes_.reset(size == 0 ? nullptr : static_cast<std::byte*>(std::malloc(size)));
     size_ = bytes_ == nullptr ? 0 : size;
     return size_ == size;
   }
 
   [[nodiscard]] std::size_t size() const noexcept { return size_; }
   [[nodiscard]] bool empty() const noexcept { return size_ == 0; }
-  [[nodiscard]] std::span<std::byte> bytes() noexcept { return {bytes_, size_}; }
-  [[nodiscard]] std::span<const std::byte> bytes() const noexcept { return {bytes_, size_}; }
+  [[nodiscard]] std::span<std::byte> bytes() noexcept { return {bytes_.get(), size_}; }
+  [[nodiscard]] std::span<const std::byte> bytes() const noexcept { return {bytes_.get(), size_}; }
   /// The bytes as text, for content that is text.
   [[nodiscard]] std::string_view text() const noexcept {
-    return {reinterpret_cast<const char*>(bytes_), size_};
+    return {reinterpret_cast<const char*>(bytes_.get()), size_};
   }
 
   /// Gives the block away; the caller frees it. Null when empty.
   [[nodiscard]] std::byte* release() noexcept {
     size_ = 0;
-    return std::exchange(bytes_, nullptr);
+    return bytes_.release();
   }
 
  private:
-  std::byte* bytes_ = nullptr;
+  struct Free {
+    void operator()(std::byte* bytes) const noexcept { std::free(bytes); }
+  };
+  std::unique_ptr<std::byte, Free> bytes_;
   std::size_t size_ = 0;
 };
 

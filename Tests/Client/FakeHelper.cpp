@@ -24,7 +24,7 @@ namespace {
 constexpr std::string_view kFileName = "/com.zarvo.halvec.mobile-helper";
 
 void Require(bool condition, const char* what) {
-  if (!condition) throw std::runtime_error(std::string(what) + ": " + std::strerror(errno));
+  if (!condition) throw std::runtime_error(std::string(what) + ": " + ::strerrordesc_np(errno));
 }
 
 std::size_t CountDescriptors() {
