@@ -102,6 +102,7 @@ TEST_F(PreferenceFault, LosesNoKeyAmongContendingStores) {
   constexpr int kStores = 4;
   constexpr int kRounds = 15;
   std::vector<std::thread> writers;
+  writers.reserve(kStores);
   for (int i = 0; i < kStores; ++i) {
     writers.emplace_back([this, i] {
       PreferenceFiles files = store(std::chrono::minutes(1));
@@ -176,7 +177,7 @@ class PreferenceFullDisk : public PreferenceFault {
     if (::unshare(CLONE_NEWNS) != 0 ||
         ::mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0 ||
         ::mount("tmpfs", temporary.path().c_str(), "tmpfs", 0, "size=64k") != 0) {
-      GTEST_SKIP() << "cannot mount a small file system: " << std::strerror(errno);
+      GTEST_SKIP() << "cannot mount a small file system: " << ::strerrordesc_np(errno);
     }
     mounted_ = true;
   }

@@ -102,7 +102,7 @@ TEST_F(PreferenceKill, AtEverySystemCallLeavesTheOldOrTheNewValue) {
       if (files.synchronize(domain)) Acknowledge(pipe, 1);
     });
     if (ending == Ending::kNotTraceable) {
-      GTEST_SKIP() << "child processes cannot be traced here: " << std::strerror(errno);
+      GTEST_SKIP() << "child processes cannot be traced here: " << ::strerrordesc_np(errno);
     }
     const bool acknowledged = LastAcknowledged(pipe, 0) == 1;
     fakes::FakeSystemLog log;

@@ -203,6 +203,7 @@ TYPED_TEST(PreferencesStoreContract, ServesSeveralThreads) {
   constexpr int kThreads = 4;
   constexpr int kRounds = 20;
   std::vector<std::thread> threads;
+  threads.reserve(kThreads);
   for (int t = 0; t < kThreads; ++t) {
     threads.emplace_back([&, t] {
       for (int i = 0; i < kRounds; ++i) {

@@ -16,7 +16,6 @@ using platform::SerializeXml;
 using property_list_test::Document;
 using property_list_test::Nested;
 using property_list_test::Parse;
-using property_list_test::TextOf;
 
 std::string NestedXml(std::size_t count) {
   std::string text;

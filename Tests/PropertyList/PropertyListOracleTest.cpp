@@ -31,6 +31,7 @@ namespace fs = std::filesystem;
 int RunPython(std::vector<std::string> arguments) {
   arguments.insert(arguments.begin(), "python3");
   std::vector<char*> pointers;
+  pointers.reserve(arguments.size() + 1);
   for (std::string& argument : arguments) pointers.push_back(argument.data());
   pointers.push_back(nullptr);
   pid_t child = 0;

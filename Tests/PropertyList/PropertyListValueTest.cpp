@@ -143,8 +143,9 @@ TEST(PropertyListValue, IsCopiedComparedAndDestroyedAtTheDepthLimit) {
   // A thread of its own, as work queues have them.
   std::thread([&] {
     const PropertyList value = Nested(deepest);
-    const PropertyList copy = value;
+    PropertyList copy = value;
     equal = copy == value;
+    copy.array()->clear();
   }).join();
   EXPECT_TRUE(equal);
 }

@@ -88,7 +88,9 @@ TEST_F(SystemLogSocketTest, SendsPriorityTimeNameAndProcess) {
   for (const auto& [priority, text] : {std::pair{"<27>", "VM_ALLOCATE 12l (mhs1)\n"},
                                        std::pair{"<29>", ""}, std::pair{"<30>", "  blanks  "}}) {
     const std::string line = take(log).value_or("no line");
-    EXPECT_TRUE(line == priority + before + sent + text || line == priority + after + sent + text)
+    const std::string rest = sent + text;
+    EXPECT_TRUE(line == std::string(priority).append(before).append(rest) ||
+                line == std::string(priority).append(after).append(rest))
         << line;
   }
   EXPECT_FALSE(take(log));
@@ -100,7 +102,9 @@ TEST_F(SystemLogSocketTest, SendsLongTextsWholeAndTheLongestCut) {
   const std::string text(100'000, 'x');
   sender.write(LogPriority::kError, text);
   EXPECT_EQ(textOf(take(log)), text);
-  sender.write(LogPriority::kError, std::string(10'000'000, 'y'));
+  std::string longer;
+  longer.resize(10'000'000, 'y');
+  sender.write(LogPriority::kError, longer);
   EXPECT_EQ(textOf(take(log)), std::string(65'536, 'y'));
 }
 
