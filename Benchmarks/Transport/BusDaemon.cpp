@@ -81,9 +81,10 @@ std::optional<BusDaemon> StartDaemon(int processor, std::string& reason) {
   std::ofstream(configuration)
       << "<!DOCTYPE busconfig PUBLIC \"-//freedesktop//DTD D-Bus Bus Configuration 1.0//EN\" "
          "\"http://www.freedesktop.org/standards/dbus/1.0/busconfig.dtd\">\n"
-         "<busconfig><listen>unix:path="
+         "<busconfig><type>session</type><listen>unix:path="
       << socket
-      << "</listen><auth>EXTERNAL</auth><policy context=\"default\"><allow user=\"*\"/>"
+      << "</listen><servicedir>/usr/share/dbus-1/services</servicedir><auth>EXTERNAL</auth><policy "
+         "context=\"default\"><allow user=\"*\"/>"
          "<allow own=\"*\"/><allow send_type=\"method_call\"/><allow send_destination=\"*\"/>"
          "<allow receive_sender=\"*\"/></policy></busconfig>\n";
   std::array<int, 2> ready{};
