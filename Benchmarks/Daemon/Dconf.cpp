@@ -15,17 +15,18 @@ namespace bench {
 namespace {
 
 struct Unref {
-  void operator()(DConfClient* client) const { g_object_unref(client); }
+  void operator()(void* object) const { g_object_unref(object); }
 };
 
 class SessionStore final : public DconfStore {
  public:
-  explicit SessionStore(BusDaemon bus) : bus_(std::move(bus)), client_(dconf_client_new()) {
-    // The library shares this connection, and by default ends the process when the bus goes.
-    GDBusConnection* connection = g_bus_get_sync(G_BUS_TYPE_SESSION, nullptr, nullptr);
-    if (!connection) Fail("session bus");
-    g_dbus_connection_set_exit_on_close(connection, FALSE);
-    g_object_unref(connection);
+  explicit SessionStore(BusDaemon bus)
+      : bus_(std::move(bus)),
+        connection_(g_bus_get_sync(G_BUS_TYPE_SESSION, nullptr, nullptr)),
+        client_(dconf_client_new()) {
+    if (!connection_) Fail("session bus");
+    // The store shares this connection, which by default ends the process when the bus goes.
+    g_dbus_connection_set_exit_on_close(connection_.get(), FALSE);
   }
   void set(int value) override {
     GError* error = nullptr;
@@ -37,6 +38,7 @@ class SessionStore final : public DconfStore {
 
  private:
   BusDaemon bus_;
+  std::unique_ptr<GDBusConnection, Unref> connection_;
   std::unique_ptr<DConfClient, Unref> client_;
 };
 
