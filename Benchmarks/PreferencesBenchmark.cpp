@@ -9,7 +9,6 @@
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
-#include <cstdlib>
 #include <filesystem>
 #include <string>
 #include <vector>
@@ -41,7 +40,7 @@ double Median(std::vector<double>& values) {
 void Require(bool holds, const char* what) {
   if (holds) return;
   std::fprintf(stderr, "failed: %s\n", what);
-  std::exit(1);
+  ::_exit(1);
 }
 
 void WriteDurably(const FileDescriptor& folder, const std::vector<std::byte>& bytes) {
