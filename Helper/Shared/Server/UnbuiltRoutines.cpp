@@ -20,17 +20,6 @@ KernReturn server_HvMobileHelperCopyVoicemailTokenForKey(PortName, wire::Text<25
 KernReturn server_HvMobileHelperCopyVoicemailToken(PortName, wire::Text<256>&) {
   return KERN_FAILURE;
 }
-KernReturn server_HvMobileHelperSetCarrierBundleLink(PortName, wire::Text<1024>&, wire::Text<1024>&,
-                                                     wire::Text<1024>&) {
-  return KERN_FAILURE;
-}
-KernReturn server_HvMobileHelperCreateSymlink(PortName, wire::Text<1024>&, wire::Text<1024>&) {
-  return KERN_FAILURE;
-}
-KernReturn server_HvMobileHelperRemoveCarrierBundleLink(PortName, wire::Text<1024>&,
-                                                        wire::Text<1024>&) {
-  return KERN_FAILURE;
-}
 KernReturn server_HvMobileHelperIsVoicemailSubscribed(PortName, wire::Flag&) {
   return KERN_FAILURE;
 }
@@ -58,9 +47,5 @@ KernReturn server_HvMobileHelperSetRadioManagerLogging(PortName, std::int32_t) {
 }
 KernReturn server_HvMobileHelperExtractArchive(PortName, wire::Text<256>&, wire::Text<256>&,
                                                wire::Flag&) {
-  return KERN_FAILURE;
-}
-KernReturn server_HvMobileHelperCopyPropertyListFile(PortName, wire::Text<256>&, wire::Address*,
-                                                     std::uint32_t*) {
   return KERN_FAILURE;
 }
