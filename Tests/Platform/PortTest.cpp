@@ -275,6 +275,19 @@ TEST_F(PortDeath, IsTheExitOfTheProcessThatSentTheRight) {
   EXPECT_EQ(PortDeallocate(port), KERN_SUCCESS);
 }
 
+TEST_F(PortDeath, IsAnExitThatCameBeforeTheWatch) {
+  const pid_t child = ::fork();
+  if (child == 0) ::_exit(0);
+  const auto holder = std::make_shared<const FileDescriptor>(OpenPidfd(child));
+  siginfo_t information{};
+  ASSERT_EQ(::waitid(P_PID, static_cast<id_t>(child), &information, WEXITED | WNOWAIT), 0);
+  const PortName port = PortAdoptSendRight(std::move(pair.send), holder);
+  const auto watcher = watch(port);
+  EXPECT_EQ(calls, 1);
+  ::waitpid(child, nullptr, 0);
+  EXPECT_EQ(PortDeallocate(port), KERN_SUCCESS);
+}
+
 TEST_F(PortDeath, IsAnythingThatArrivesOnThePort) {
   const PortName port = PortAdoptSendRight(std::move(pair.send), nullptr);
   const auto watcher = watch(port);

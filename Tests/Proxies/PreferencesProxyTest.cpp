@@ -153,6 +153,29 @@ TEST_F(PreferencesProxy, AppCopySearchesTheUsualScopesAndLogsItsOwnLine) {
   EXPECT_EQ(memory.regions, 0);
 }
 
+TEST_F(PreferencesProxy, SynchronizesTheDomainOnceInEachOfItsRequests) {
+  using Domains = std::vector<fakes::FakePreferencesStore::Domain>;
+  using enum platform::UserScope;
+  using enum platform::HostScope;
+  const Domains plain{{"domain", kCurrentUser, kAnyHost}};
+  ASSERT_EQ(set(kXml), 0);
+  EXPECT_EQ(store.takeSynchronized(), plain);
+  (void)copy(kCopy);
+  EXPECT_EQ(store.takeSynchronized(), plain);
+  (void)copy(kCopyApp);
+  EXPECT_EQ(store.takeSynchronized(), (Domains{{"domain", kCurrentUser, kCurrentHost},
+                                               {"domain", kCurrentUser, kAnyHost},
+                                               {"domain", kAnyUser, kCurrentHost},
+                                               {"domain", kAnyUser, kAnyHost}}));
+  (void)set("xy");
+  EXPECT_TRUE(store.takeSynchronized().empty()) << "nothing was stored";
+}
+
+TEST_F(PreferencesProxy, SetAnswersZeroAlsoWhenTheStoreCannotWrite) {
+  store.setWritable(false);
+  EXPECT_EQ(set(kXml), 0);
+}
+
 TEST_F(PreferencesProxy, CopyOfAMissingKeyAnswersZeroWithAnEmptyDescriptor) {
   EXPECT_EQ(copy(kCopy), withContent(kCopy, ""));
   EXPECT_EQ(copy(kCopyApp), withContent(kCopyApp, ""));

@@ -3,8 +3,13 @@
 // What a connect leaves behind in the server, and what a client's death takes away.
 #include <fcntl.h>
 #include <sys/resource.h>
+#include <sys/wait.h>
 
+#include <future>
+
+#include "Helper/Platform/GlobalQueue.h"
 #include "Helper/Platform/Port.h"
+#include "Helper/Platform/ProcessIdentity.h"
 #include "Helper/Shared/Server/PortToServerMap.h"
 #include "Tests/Support/ServerFixture.h"
 
@@ -146,6 +151,40 @@ TEST_F(Connect, GivesEachClientAPrivatePortOfItsOwn) {
   pump();
   const support::Packet reply = request(*second, support::Message(8683551, 24));
   EXPECT_EQ(reply.bytes.size(), 36U) << "the other client is served on";
+}
+
+TEST_F(Connect, IsNotDeliveredBeforeTheExitsThatPrecedeIt) {
+  // A process that is entitled and ends, while the queue that would hear of it is kept busy.
+  int release[2];
+  ASSERT_EQ(::pipe2(release, O_CLOEXEC), 0);
+  const pid_t child = ::fork();
+  if (child == 0) {
+    ::close(release[1]);
+    char byte = 0;
+    (void)!::read(release[0], &byte, 1);
+    ::_exit(0);
+  }
+  ::close(release[0]);
+  wire::AuditToken token;
+  token.words[5] = static_cast<std::uint32_t>(child);
+  token.words[7] = platform::ProcessVersion(platform::OpenPidfd(child).get(), child);
+  ASSERT_TRUE(CallerHasEntitlement(wire::kRequiredEntitlement, token));
+  ASSERT_EQ(GetEntitlementRegistrySize().watchers, 1U);
+
+  std::promise<void> busy;
+  std::promise<void> go;
+  platform::PostToGlobalQueue([&busy, gate = go.get_future().share()] {
+    busy.set_value();
+    gate.wait();
+  });
+  busy.get_future().wait();
+  ::close(release[1]);
+  ::waitpid(child, nullptr, 0);
+  // Only the connecting process itself is remembered once it has been let in.
+  const auto client = connect();
+  EXPECT_EQ(GetEntitlementRegistrySize().grants, 1U);
+  EXPECT_EQ(GetEntitlementRegistrySize().watchers, 1U);
+  go.set_value();
 }
 
 TEST_F(Connect, RemovalOfNothingIsHarmless) {

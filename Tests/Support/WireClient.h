@@ -26,7 +26,8 @@ void Put(Bytes& bytes, std::size_t offset, T value) {
 template <class T>
 [[nodiscard]] T Get(const Bytes& bytes, std::size_t offset) {
   T value{};
-  if (offset + sizeof value <= bytes.size()) std::memcpy(&value, bytes.data() + offset, sizeof value);
+  if (offset + sizeof value <= bytes.size())
+    std::memcpy(&value, bytes.data() + offset, sizeof value);
   return value;
 }
 void PutText(Bytes& bytes, std::size_t offset, const std::string& text);
