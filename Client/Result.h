@@ -5,9 +5,9 @@
 #pragma once
 
 #include <cassert>
-#include <optional>
 #include <string>
 #include <utility>
+#include <variant>
 
 #include "Client/halvec_mobile_helper.h"
 #include "Helper/Shared/Interface/ReturnCodes.h"
@@ -40,19 +40,24 @@ struct [[nodiscard]] Error {
 template <class T>
 class [[nodiscard]] Result {
  public:
-  Result(Error error) : error_(error) { assert(error.failed()); }  // NOLINT: converts by design
-  Result(T value) : value_(std::move(value)) {}                    // NOLINT: converts by design
+  Result(Error error) : outcome_(error) { assert(error.failed()); }  // NOLINT: converts by design
+  Result(T value) : outcome_(std::move(value)) {}                    // NOLINT: converts by design
 
-  [[nodiscard]] explicit operator bool() const noexcept { return value_.has_value(); }
-  [[nodiscard]] const Error& error() const noexcept { return error_; }
+  [[nodiscard]] explicit operator bool() const noexcept {
+    return std::holds_alternative<T>(outcome_);
+  }
+  /// No error when there is a value.
+  [[nodiscard]] Error error() const noexcept {
+    const Error* error = std::get_if<Error>(&outcome_);
+    return error == nullptr ? Error{} : *error;
+  }
   /// The value; only when there is one.
-  [[nodiscard]] T& operator*() noexcept { return *value_; }
-  [[nodiscard]] const T& operator*() const noexcept { return *value_; }
-  [[nodiscard]] T* operator->() noexcept { return &*value_; }
+  [[nodiscard]] T& operator*() noexcept { return *operator->(); }
+  [[nodiscard]] const T& operator*() const noexcept { return *std::get_if<T>(&outcome_); }
+  [[nodiscard]] T* operator->() noexcept { return std::get_if<T>(&outcome_); }
 
  private:
-  Error error_;
-  std::optional<T> value_;
+  std::variant<Error, T> outcome_;
 };
 
 /// Done, or the error.
