@@ -97,7 +97,7 @@ int Rounds(int count) {
 /// or while it is leaving, at random. Says how many of the connects were served.
 int Race(int count) {
   std::mt19937 random(std::random_device{}());
-  std::uniform_int_distribution<long> microseconds(-1000, 6000);
+  std::uniform_int_distribution<long> microseconds(-1000, 9000);
   int served = 0;
   for (int round = 0; round < count; ++round) {
     support::WireClient client(kServicePath);
