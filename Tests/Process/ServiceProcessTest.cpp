@@ -43,6 +43,31 @@ TEST_F(Service, RemovesAPreferenceWithASingleByte) {
   EXPECT_EQ(outcome.output, "0\n0\nend\n") << outcome.errors;
 }
 
+TEST_F(Service, ServesTheCommandLineFromSetToRemoval) {
+  const Outcome outcome =
+      run("halvecctl=/usr/libexec/halvec/halvecctl\n"
+          "$halvecctl preference set com.zarvo.carrier Mtu 1430 --integer\n"
+          "$halvecctl preference get com.zarvo.carrier Mtu\n"
+          "$halvecctl preference get com.zarvo.carrier Mtu --app --xml\n"
+          "$halvecctl preference remove com.zarvo.carrier Mtu\n"
+          "$halvecctl preference get com.zarvo.carrier Mtu; echo $?\n"
+          "handset as mobile -- $halvecctl preference get com.zarvo.carrier Mtu; echo $?");
+  EXPECT_EQ(outcome.output,
+            "1430\n<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n"
+            "<integer>1430</integer>\n</plist>\n6\n4\n")
+      << outcome.errors;
+}
+
+TEST_F(Service, CarriesALargeValueBothWaysThroughSealedMemory) {
+  const Outcome outcome =
+      run("halvecctl=/usr/libexec/halvec/halvecctl\n"
+          "{ echo '<plist version=\"1.0\"><string>'; head -c 400000 /dev/zero | tr '\\0' x;\n"
+          "  echo '</string></plist>'; } >/tmp/large.plist\n"
+          "$halvecctl preference set d large --plist /tmp/large.plist\n"
+          "$halvecctl preference get d large | tr -d '\\n' | wc -c");
+  EXPECT_EQ(outcome.output, "400000\n") << outcome.errors;
+}
+
 TEST_F(Service, LogsTheAllocationOfACopyByteForByte) {
   const Outcome outcome = run(std::string("client set d k ") + kValue +
                               "; client get d k >/dev/null; handset log --json");
