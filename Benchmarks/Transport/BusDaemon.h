@@ -13,7 +13,7 @@ namespace bench {
 
 struct BusDaemon {
   Child process;
-  std::string address;  // in the form of the D-Bus specification
+  std::string address;  // as D-Bus clients write it: transport:key=value
 };
 
 /// A listening stream socket at `path`, non-blocking: brokers accept until nobody is left.
