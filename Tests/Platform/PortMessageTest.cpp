@@ -10,6 +10,7 @@
 
 #include "Helper/Platform/ProcessIdentity.h"
 #include "Helper/Platform/TaskMemory.h"
+#include "Tests/Fakes/FakeTaskMemory.h"
 #include "Tests/Support/WireClient.h"
 
 namespace {
@@ -207,20 +208,6 @@ TEST_F(PortMessage, WithEmptyMemoryHasANullAddress) {
 }
 
 /// Sending: what leaves, and what leaves the address space with it.
-class CountingMemory final : public TaskMemory {
- public:
-  KernReturn allocate(VmAddress& address, std::size_t size) override {
-    ++regions;
-    return real.allocate(address, size);
-  }
-  void deallocate(VmAddress address, std::size_t size) override {
-    --regions;
-    real.deallocate(address, size);
-  }
-  TaskMemory& real = DefaultProvider<TaskMemory>();
-  int regions = 0;
-};
-
 class OutgoingMessage : public ::testing::Test {
  protected:
   /// A reply that hands over `size` bytes.
@@ -238,7 +225,7 @@ class OutgoingMessage : public ::testing::Test {
     wire::Store(bytes.data() + 40, size);
     return bytes;
   }
-  CountingMemory memory;
+  fakes::FakeTaskMemory memory;
   ScopedReplacement<TaskMemory> replacement{memory};
   support::PortPair port = support::MakePort();
 };
@@ -251,7 +238,7 @@ TEST_F(OutgoingMessage, CarriesUpTo128KiBBehindIt) {
     ASSERT_EQ(packet.bytes.size(), 56 + size);
     EXPECT_EQ(Get<std::uint64_t>(packet.bytes, 28), 0U);
     EXPECT_TRUE(packet.descriptors.empty());
-    EXPECT_EQ(memory.regions, 0) << "the region has left the address space";
+    EXPECT_EQ(memory.regions(), 0) << "the region has left the address space";
   }
 }
 
@@ -268,17 +255,17 @@ TEST_F(OutgoingMessage, CarriesMoreInSealedMemory) {
   std::string content(131074, '\0');
   EXPECT_EQ(::pread(file, content.data(), content.size(), 0), 131073);
   EXPECT_EQ(content.substr(0, 131073), std::string(131073, 'z'));
-  EXPECT_EQ(memory.regions, 0);
+  EXPECT_EQ(memory.regions(), 0);
 }
 
 TEST_F(OutgoingMessage, GivesItsMemoryBackWhenNobodyReceivesIt) {
   port.receive.reset();
   std::vector<std::byte> message = reply(100);
   EXPECT_FALSE(SendMessage(port.send.get(), message.data()));
-  EXPECT_EQ(memory.regions, 0);
+  EXPECT_EQ(memory.regions(), 0);
   message = reply(100);
   EXPECT_FALSE(SendMessage(-1, message.data()));
-  EXPECT_EQ(memory.regions, 0);
+  EXPECT_EQ(memory.regions(), 0);
 }
 
 TEST_F(OutgoingMessage, DoesNotWaitForAReceiverThatDoesNotRead) {

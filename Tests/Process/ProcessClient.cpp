@@ -18,10 +18,8 @@ namespace {
 
 using support::Bytes;
 using support::Get;
-using support::Put;
 
 constexpr const char* kServicePath = HALVEC_PORTS_DIRECTORY "/com.zarvo.halvec.mobile-helper";
-constexpr std::int32_t kSetPreferenceValue = 8683555;
 constexpr std::int32_t kCopyPreferenceValue = 8683556;
 
 /// Connects; 0, or the code of the refusal.
@@ -56,18 +54,8 @@ int Hold() {
 int SetPreference(const std::string& domain, const std::string& key, const std::string& value) {
   support::WireClient client(kServicePath);
   if (const std::int32_t code = Connect(client)) return std::printf("refused with %d\n", code) > 0;
-  Bytes bytes(568);
-  Put(bytes, 0, 0x80000000U);
-  Put(bytes, 4, 568U);
-  Put(bytes, 20, kSetPreferenceValue);
-  Put(bytes, 24, 1U);
-  bytes[39] = 1;
-  Put(bytes, 40, static_cast<std::uint32_t>(value.size()));
-  support::PutText(bytes, 52, domain);
-  support::PutText(bytes, 308, key);
-  Put(bytes, 564, static_cast<std::uint32_t>(value.size()));
-  bytes.insert(bytes.end(), value.begin(), value.end());
-  std::printf("%d\n", Get<std::int32_t>(Ask(client, bytes), 32));
+  std::printf("%d\n", Get<std::int32_t>(
+                          Ask(client, support::SetPreferenceRequest(domain, key, value)), 32));
   return 0;
 }
 

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // The preferences proxy over real ports, on a fake store.
-#include "Helper/Platform/TaskMemory.h"
 #include "Tests/Fakes/FakePreferencesStore.h"
+#include "Tests/Fakes/FakeTaskMemory.h"
 #include "Tests/Support/ServerFixture.h"
 
 namespace {
@@ -14,29 +14,11 @@ using support::Get;
 using support::Put;
 using Lines = std::vector<fakes::FakeSystemLog::Line>;
 
-constexpr std::int32_t kSet = 8683555;
 constexpr std::int32_t kCopy = 8683556;
 constexpr std::int32_t kCopyApp = 8683557;
 constexpr char kXml[] =
     "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n"
     "<string>value</string>\n</plist>\n";
-
-/// Memory that can be made to run out.
-class FailingMemory final : public platform::TaskMemory {
- public:
-  KernReturn allocate(platform::VmAddress& address, std::size_t size) override {
-    if (fails) return KERN_NO_SPACE;
-    ++regions;
-    return real.allocate(address, size);
-  }
-  void deallocate(platform::VmAddress address, std::size_t size) override {
-    --regions;
-    real.deallocate(address, size);
-  }
-  platform::TaskMemory& real = platform::DefaultProvider<platform::TaskMemory>();
-  bool fails = false;
-  int regions = 0;
-};
 
 class PreferencesProxy : public support::ServerFixture {
  protected:
@@ -44,24 +26,10 @@ class PreferencesProxy : public support::ServerFixture {
     start();
     client = connect();
   }
-  static Bytes setRequest(const std::string& domain, const std::string& key,
-                          const std::string& value) {
-    Bytes bytes(568);
-    Put(bytes, 0, 0x80000000U);
-    Put(bytes, 4, 568U);
-    Put(bytes, 20, kSet);
-    Put(bytes, 24, 1U);
-    bytes[39] = 1;
-    Put(bytes, 40, static_cast<std::uint32_t>(value.size()));
-    support::PutText(bytes, 52, domain);
-    support::PutText(bytes, 308, key);
-    Put(bytes, 564, static_cast<std::uint32_t>(value.size()));
-    bytes.insert(bytes.end(), value.begin(), value.end());
-    return bytes;
-  }
   std::int32_t set(const std::string& value, const std::string& domain = "domain",
                    const std::string& key = "key") {
-    return Get<std::int32_t>(request(*client, setRequest(domain, key, value)).bytes, 32);
+    return Get<std::int32_t>(
+        request(*client, support::SetPreferenceRequest(domain, key, value)).bytes, 32);
   }
   Bytes copy(std::int32_t id, const std::string& domain = "domain",
              const std::string& key = "key") {
@@ -89,7 +57,7 @@ class PreferencesProxy : public support::ServerFixture {
 
   fakes::FakePreferencesStore store;
   platform::ScopedReplacement<platform::PreferencesStore> storeReplacement{store};
-  FailingMemory memory;
+  fakes::FakeTaskMemory memory;
   platform::ScopedReplacement<platform::TaskMemory> memoryReplacement{memory};
   std::unique_ptr<support::WireClient> client;
 };
@@ -141,7 +109,7 @@ TEST_F(PreferencesProxy, CopyAnswersTheXmlFormAndLogsTheAllocation) {
   ASSERT_EQ(set(kXml), 0);
   EXPECT_EQ(copy(kCopy), withContent(kCopy, kXml));
   EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 93l (mhs1)\n"}}));
-  EXPECT_EQ(memory.regions, 0) << "the region leaves with the reply";
+  EXPECT_EQ(memory.regions(), 0) << "the region leaves with the reply";
 }
 
 TEST_F(PreferencesProxy, AppCopySearchesTheUsualScopesAndLogsItsOwnLine) {
@@ -150,7 +118,7 @@ TEST_F(PreferencesProxy, AppCopySearchesTheUsualScopesAndLogsItsOwnLine) {
   EXPECT_EQ(copy(kCopy), withContent(kCopy, ""));
   EXPECT_EQ(copy(kCopyApp), withContent(kCopyApp, kXml));
   EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 93l (mhs2)\n"}}));
-  EXPECT_EQ(memory.regions, 0);
+  EXPECT_EQ(memory.regions(), 0);
 }
 
 TEST_F(PreferencesProxy, SynchronizesTheDomainOnceInEachOfItsRequests) {
@@ -202,7 +170,7 @@ TEST_F(PreferencesProxy, CopyOfAValueThatXmlCannotCarryAnswers5) {
 
 TEST_F(PreferencesProxy, CopyAnswersTheAllocationsCodeAndLogsTheFailedAllocationToo) {
   ASSERT_EQ(set(kXml), 0);
-  memory.fails = true;
+  memory.runOut();
   for (const std::int32_t id : {kCopy, kCopyApp}) {
     const Bytes reply = copy(id);
     EXPECT_EQ(reply.size(), 36U);
@@ -224,7 +192,7 @@ TEST_F(PreferencesProxy, CopyOfALargeValueArrivesInSealedMemory) {
   EXPECT_EQ(::pread(reply.descriptors[0].get(), content.data(), content.size(), 0),
             static_cast<ssize_t>(content.size()));
   EXPECT_NE(content.find("vvv</string>"), std::string::npos);
-  EXPECT_EQ(memory.regions, 0);
+  EXPECT_EQ(memory.regions(), 0);
 }
 
 }  // namespace

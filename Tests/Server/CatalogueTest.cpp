@@ -100,20 +100,8 @@ class RequestWire : public support::ServerFixture {
     Put(reply, 32, code);
     return reply;
   }
-  /// A SetPreferenceValue request that carries `value` behind it.
   static Bytes setPreference(const std::string& value) {
-    Bytes bytes(568);
-    Put(bytes, 0, 0x80000000U);
-    Put(bytes, 4, 568U);
-    Put(bytes, 20, kSetPreferenceValue);
-    Put(bytes, 24, 1U);
-    bytes[39] = 1;
-    Put(bytes, 40, static_cast<std::uint32_t>(value.size()));
-    support::PutText(bytes, 52, "domain");
-    support::PutText(bytes, 308, "key");
-    Put(bytes, 564, static_cast<std::uint32_t>(value.size()));
-    bytes.insert(bytes.end(), value.begin(), value.end());
-    return bytes;
+    return support::SetPreferenceRequest("domain", "key", value);
   }
   std::unique_ptr<support::WireClient> client;
 };

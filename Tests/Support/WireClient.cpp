@@ -136,6 +136,23 @@ Bytes ConnectRequest() {
           0x00, 0x00, 0x00, 0x00, 0x00, 0x00, 0x00, 0x00, 0x00, 0x00, 0x11, 0x00};
 }
 
+Bytes SetPreferenceRequest(const std::string& domain, const std::string& key,
+                           const std::string& value) {
+  const auto size = static_cast<std::uint32_t>(value.size());
+  Bytes bytes(568 + value.size());
+  Put(bytes, 0, 0x80000000U);
+  Put(bytes, 4, 568U);
+  Put(bytes, 20, 8683555);
+  Put(bytes, 24, 1U);
+  bytes[39] = 1;
+  Put(bytes, 40, size);
+  PutText(bytes, 52, domain);
+  PutText(bytes, 308, key);
+  Put(bytes, 564, size);
+  PutText(bytes, 568, value);
+  return bytes;
+}
+
 void WireClient::sendConnect(const Bytes& request, bool askForCredentials) {
   PortPair own = MakePort();
   PortPair reply = MakePort();

@@ -76,6 +76,10 @@ class LauncherSocket {
 /// A header of `size` bytes' message with `id`, zero-filled up to `size`.
 [[nodiscard]] Bytes Message(std::int32_t id, std::uint32_t size);
 
+/// A SetPreferenceValue request with `value` behind it.
+[[nodiscard]] Bytes SetPreferenceRequest(const std::string& domain, const std::string& key,
+                                         const std::string& value);
+
 /// One client as it appears to the service: sends connects, keeps its own port and its private one.
 class WireClient {
  public:
