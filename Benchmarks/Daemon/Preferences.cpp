@@ -75,6 +75,13 @@ void WriteDurably(const std::string& content) {
   Synchronize(folder);
 }
 
+void AnswerBare(int socket, std::size_t replySize) {
+  std::array<std::byte, 4096> packet{};
+  while (::recv(socket, packet.data(), packet.size(), 0) > 0) {
+    if (::send(socket, packet.data(), replySize, MSG_NOSIGNAL) < 0) return;
+  }
+}
+
 std::string ContentOfDomain() {
   std::ifstream file(std::string(kPreferences) + "/" + kDomain + ".plist", std::ios::binary);
   return {std::istreambuf_iterator<char>(file), {}};
@@ -84,21 +91,13 @@ std::string ContentOfDomain() {
 
 Table MeasurePreferenceReads() {
   PinTo(Processors().front());
-  const Session session = StartSession("reads");
-  Set(session, 1);
   const auto request = TextRequest(kCopyPreference, std::array<std::string, 2>{kDomain, "Count"});
   std::array<std::byte, 4096> reply{};
-  const std::size_t replySize = Call(session.client.privatePort, request, reply);
-  constexpr std::size_t kFirstSizeOfAValue = 57;
-  if (replySize < kFirstSizeOfAValue) Fail("no value");
-
-  const SocketPair pair = MakePair(SOCK_SEQPACKET);
-  const Child bare(-1, [&] {
-    std::array<std::byte, 4096> packet;
-    while (::recv(pair.second.get(), packet.data(), packet.size(), 0) > 0) {
-      if (::send(pair.second.get(), packet.data(), replySize, MSG_NOSIGNAL) < 0) return;
-    }
-  });
+  std::size_t replySize = 0;
+  Table table{.title = "a cached preference, one processor",
+              .unit = "us",
+              .figures = {},
+              .notes = {"the helper writes one log line for each value that it hands out"}};
   const auto measure = [&](const FileDescriptor& port) {
     constexpr int kCalls = 200;
     return MicrosecondsOf([&] {
@@ -106,30 +105,38 @@ Table MeasurePreferenceReads() {
            }) /
            kCalls;
   };
-  Table table{.title = "a cached preference, " + std::to_string(request.size()) + " bytes in, " +
-                       std::to_string(replySize) + " out, one processor",
-              .unit = "us",
-              .figures = {},
-              .notes = {"the helper writes one log line for each value that it hands out"}};
-  constexpr double kGoal = 1.25;
-  constexpr int kRounds = 51;
-  std::vector<double> bareRounds, rounds;
-  for (int round = 0; round < kRounds; ++round) {
-    bareRounds.push_back(measure(pair.first));
-    rounds.push_back(measure(session.client.privatePort));
+  const auto compare = [&](const char* name) {
+    // A helper of its own, so that it finds the log daemon, or finds none, from the start.
+    const Session session = StartSession("reads");
+    Set(session, 1);
+    replySize = Call(session.client.privatePort, request, reply);
+    constexpr std::size_t kLeastSizeWithAValue = 57;
+    if (replySize < kLeastSizeWithAValue) Fail("no value");
+    const SocketPair pair = MakePair(SOCK_SEQPACKET);
+    const Child bare(-1, [&] { AnswerBare(pair.second.get(), replySize); });
+    std::vector<double> bareRounds, rounds;
+    constexpr int kRounds = 101;
+    for (int round = 0; round < kRounds; ++round) {
+      bareRounds.push_back(measure(pair.first));
+      rounds.push_back(measure(session.client.privatePort));
+    }
+    constexpr double kGoal = 1.25;
+    if (table.figures.empty()) {
+      table.figures.push_back({"bare round trip", Median(bareRounds), 1.0, {}});
+    }
+    table.figures.push_back({name, Median(rounds), PairedRatio(rounds, bareRounds), kGoal});
+  };
+  compare("helper, no log daemon runs");
+  {
+    const Child log = StartLogDaemon(Processors().front());
+    compare("helper, a log daemon reads on the same processor");
   }
-  table.figures.push_back({"bare round trip", Median(bareRounds), 1.0, {}});
-  table.figures.push_back(
-      {"helper, no log daemon runs", Median(rounds), PairedRatio(rounds, bareRounds), kGoal});
-  const Child log = StartLogDaemon(Processors().back());
-  bareRounds.clear();
-  rounds.clear();
-  for (int round = 0; round < kRounds; ++round) {
-    bareRounds.push_back(measure(pair.first));
-    rounds.push_back(measure(session.client.privatePort));
+  if (Processors().size() > 1) {
+    const Child log = StartLogDaemon(Processors().back());
+    compare("helper, a log daemon reads on another processor");
   }
-  table.figures.push_back({"helper, a log daemon reads on another processor", Median(rounds),
-                           PairedRatio(rounds, bareRounds), kGoal});
+  table.title +=
+      ", " + std::to_string(request.size()) + " bytes in, " + std::to_string(replySize) + " out";
   return table;
 }
 
