@@ -58,7 +58,8 @@ char* CFStringGetOrCreateCString(platform::Allocator* allocator, const platform:
                                  platform::StringEncoding encoding) {
   const std::string_view text = string->encodablePart(encoding);
   const bool whole = text.size() == string->utf8().size();
-  if (buffer && size && whole && text.size() < *size) return platform::WriteText(text, buffer, size);
+  if (buffer && size && whole && text.size() < *size)
+    return platform::WriteText(text, buffer, size);
   if (!allocator) allocator = &platform::DefaultAllocator();
   if (void* block = allocator->allocate(text.size() + 1)) {
     return platform::WriteText(text, static_cast<char*>(block), size);
