@@ -287,7 +287,9 @@ bool AppendDate(PropertyList::Date date, std::string& text) {
       (std::chrono::sys_days{std::chrono::year{10'000} / 1 / 1} - kEpoch).count() * kSecondsPerDay);
   // False for a NaN as well.
   if (!(date.seconds >= kFirst && date.seconds < kBeyond)) return false;
-  const auto seconds = static_cast<std::int64_t>(std::floor(date.seconds));
+  // Rounded down by hand: the one call into the mathematics library would make every start load it.
+  const auto cut = static_cast<std::int64_t>(date.seconds);
+  const std::int64_t seconds = static_cast<double>(cut) > date.seconds ? cut - 1 : cut;
   std::int64_t days = seconds / kSecondsPerDay;
   std::int64_t rest = seconds % kSecondsPerDay;
   if (rest < 0) {
