@@ -43,13 +43,14 @@ TEST(HalvecctlList, TakesGlobalOptionsBeforeTheCommandToo) {
 TEST(HalvecctlHelp, NamesEveryCommandAndExitCode) {
   const Outcome outcome = RunProgram({"--help"});
   EXPECT_EQ(outcome.exitCode, 0);
-  for (const char* text : {"list ", "preference ", "call ", "--timeout", "  6  the preference"}) {
+  for (const char* text : {"list ", "preference ", "bundle ", "path ", "plist ", "call ",
+                           "--timeout", "  6  the preference"}) {
     EXPECT_NE(outcome.output.find(text), std::string::npos) << text;
   }
 }
 
 TEST(HalvecctlHelp, ExistsForEveryCommand) {
-  for (const char* command : {"list", "preference", "call"}) {
+  for (const char* command : {"list", "preference", "bundle", "path", "plist", "call"}) {
     const Outcome outcome = RunProgram({command, "--help"});
     EXPECT_EQ(outcome.exitCode, 0);
     EXPECT_EQ(outcome.output.find("Usage: halvecctl " + std::string(command)), 0U);
@@ -92,6 +93,19 @@ TEST(HalvecctlUsage, ErrorsAreOneSentenceAndExitWithTwo) {
       {{"call", "SetPreferenceValue", "d", "k", "text"}, "neither @FILE nor -"},
       {{"call", "SetPreferenceValue", "d", "k", "@/nonexistent"}, "cannot open /nonexistent"},
       {{"call", "SetPreferenceValue", "d", "k", "@/"}, "cannot read /"},
+      {{"bundle"}, "expected link or unlink"},
+      {{"bundle", "mend"}, "unknown action 'mend'"},
+      {{"bundle", "link", "target"}, "expected TARGET LINK-PATH, got 1 argument"},
+      {{"bundle", "link", "t", "p", "--unchecked", "--domain", "d"}, "exclude one another"},
+      {{"bundle", "unlink"}, "expected PATH, got 0 arguments"},
+      {{"bundle", "unlink", "p", "--unchecked"}, "unknown option --unchecked"},
+      {{"path"}, "expected explain"},
+      {{"path", "walk"}, "unknown action 'walk'"},
+      {{"path", "explain"}, "expected PATH, got 0 arguments"},
+      {{"path", "explain", std::string(1024, 'x')}, "longer than a request carries"},
+      {{"plist"}, "expected show"},
+      {{"plist", "hide"}, "unknown action 'hide'"},
+      {{"plist", "show"}, "expected PATH, got 0 arguments"},
       {{"preference"}, "expected set, get or remove"},
       {{"preference", "list"}, "unknown action 'list'"},
       {{"preference", "set", "d", "k"}, "expected DOMAIN KEY VALUE, got 2 arguments"},

@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "Tests/Client/FakeHelper.h"
+#include "Tests/Halvecctl/Answered.h"
 #include "Tests/Halvecctl/Program.h"
 
 namespace {
@@ -20,31 +21,9 @@ using fake::Hex;
 using fake::PlainReply;
 using fake::Slot;
 using fake::Text;
+using program::Exchange;
 using program::Outcome;
-
-/// What the program printed, and the request that it made.
-struct Exchange {
-  Outcome outcome;
-  Bytes request;
-};
-
-/// Runs the program with `arguments` against a helper that answers its one request with `reply`.
-Exchange RunAnswered(std::vector<std::string> arguments, const Bytes& reply,
-                     const std::string& input = "") {
-  fake::Service service;
-  arguments.insert(arguments.begin(), {"--service", service.path(), "--timeout", "10"});
-  Exchange exchange;
-  fake::Beside helper([&] {
-    const fake::Connection connection = fake::Accept(service.socket());
-    exchange.request = fake::Receive(connection.privatePort.get()).bytes;
-    fake::Send(connection.privatePort.get(), reply);
-    // Stays until the program has gone, as the helper would.
-    (void)fake::Receive(connection.clientPort.get());
-  });
-  exchange.outcome = program::RunProgram(arguments, input);
-  helper.join();
-  return exchange;
-}
+using program::RunAnswered;
 
 const std::string kXmlHead =
     "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n";

@@ -24,6 +24,9 @@ struct Command {
 
 extern const Command kListCommand;
 extern const Command kPreferenceCommand;
+extern const Command kBundleCommand;
+extern const Command kPathCommand;
+extern const Command kPlistCommand;
 extern const Command kCallCommand;
 
 /// Every command, in the order of --help.

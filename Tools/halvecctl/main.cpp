@@ -87,7 +87,8 @@ void FlushOutput() {
 }  // namespace
 
 std::span<const Command* const> Commands() {
-  static constexpr std::array kCommands{&kListCommand, &kPreferenceCommand, &kCallCommand};
+  static constexpr std::array kCommands{&kListCommand, &kPreferenceCommand, &kBundleCommand,
+                                        &kPathCommand, &kPlistCommand,      &kCallCommand};
   return kCommands;
 }
 

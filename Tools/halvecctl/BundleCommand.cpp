@@ -1,0 +1,72 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// halvecctl bundle: the links by which the mobile user's library points at carrier bundles.
+#include <cstdio>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "Helper/Shared/Interface/Requests.h"
+#include "Tools/halvecctl/Command.h"
+
+namespace halvecctl {
+namespace {
+
+ExitCode Finish(const halvec::Error& error, const GlobalOptions& options) {
+  if (error.failed()) throw RequestFailure(error);
+  if (options.json) std::fputs("{\"code\":0,\"codeName\":\"KERN_SUCCESS\"}\n", stdout);
+  return ExitCode::kDone;
+}
+
+ExitCode RunLink(const GlobalOptions& options, Words words) {
+  const bool unchecked = words.takeOption("--unchecked");
+  const std::optional<std::string> domain = words.takeOptionWithValue("--domain");
+  if (unchecked && domain) throw UsageFailure("--unchecked and --domain exclude one another");
+  const std::vector<std::string> texts = words.takeAll(2, "TARGET LINK-PATH");
+  halvec::HelperClient client = Connect(options);
+  if (unchecked) {
+    return Finish(client.call<requests::CreateSymlink>(texts[0], texts[1]).error(), options);
+  }
+  return Finish(
+      client
+          .call<requests::SetCarrierBundleLink>(texts[0], texts[1], domain.value_or(std::string()))
+          .error(),
+      options);
+}
+
+ExitCode RunUnlink(const GlobalOptions& options, Words words) {
+  const std::optional<std::string> domain = words.takeOptionWithValue("--domain");
+  const std::vector<std::string> texts = words.takeAll(1, "PATH");
+  halvec::HelperClient client = Connect(options);
+  return Finish(
+      client.call<requests::RemoveCarrierBundleLink>(texts[0], domain.value_or(std::string()))
+          .error(),
+      options);
+}
+
+ExitCode RunBundle(const GlobalOptions& options, Words words) {
+  const std::optional<std::string> action = words.takeFirst();
+  if (!action) throw UsageFailure("expected link or unlink; see halvecctl bundle --help");
+  if (*action == "link") return RunLink(options, std::move(words));
+  if (*action == "unlink") return RunUnlink(options, std::move(words));
+  throw UsageFailure("unknown action '" + *action + "'; see halvecctl bundle --help");
+}
+
+}  // namespace
+
+constinit const Command kBundleCommand{
+    "bundle", "link TARGET LINK-PATH [OPTION...] | unlink PATH [--domain DOMAIN]",
+    "point a carrier-bundle link at a target, or remove it",
+    "link     replaces what stands at LINK-PATH by a symbolic link to TARGET. LINK-PATH must be "
+    "on\n"
+    "         the helper's list; halvecctl path explain tells.\n"
+    "           --domain DOMAIN  then forget the cached copy of this preference domain\n"
+    "           --unchecked      any LINK-PATH, and nothing in the log\n"
+    "unlink   removes a file, a link or an empty directory at an allowed path.\n"
+    "           --domain DOMAIN  before, forget the cached copy of this preference domain; this\n"
+    "                            happens also when the path is then refused\n"
+    "A path that is not allowed is answered with code 8.\n",
+    RunBundle};
+
+}  // namespace halvecctl
