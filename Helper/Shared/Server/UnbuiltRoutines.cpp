@@ -27,17 +27,6 @@ KernReturn server_HvMobileHelperTriggerHeartbeat(PortName, std::int32_t) { retur
 KernReturn server_HvMobileHelperTriggerDatabaseUpdate(PortName, std::uint32_t) {
   return KERN_FAILURE;
 }
-KernReturn server_HvMobileHelperCopyFile(PortName, wire::Text<256>&, wire::Text<256>&,
-                                         wire::Text<256>&, wire::Flag&) {
-  return KERN_FAILURE;
-}
-KernReturn server_HvMobileHelperCopyCrashLogs(PortName, wire::Text<256>&, wire::Flag&) {
-  return KERN_FAILURE;
-}
-KernReturn server_HvMobileHelperMoveCarrierBundles(PortName, wire::Text<256>&, wire::Text<256>&,
-                                                   wire::Text<256>&, wire::Flag&) {
-  return KERN_FAILURE;
-}
 KernReturn server_HvMobileHelperRequestCountryCodeFromLocation(PortName, double, double) {
   return KERN_FAILURE;
 }

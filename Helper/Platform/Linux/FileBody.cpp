@@ -1,0 +1,128 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "Helper/Platform/Linux/FileBody.h"
+
+#include <fcntl.h>
+#include <sys/xattr.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstddef>
+#include <string_view>
+#include <vector>
+
+namespace platform {
+namespace {
+
+constexpr std::size_t kBlock = 256 * 1024;
+
+int WriteAll(int to, const std::byte* bytes, std::size_t count, off_t offset) {
+  while (count > 0) {
+    const ssize_t written = ::pwrite(to, bytes, count, offset);
+    if (written < 0 && errno == EINTR) continue;
+    if (written < 0) return errno;
+    bytes += written;
+    count -= static_cast<std::size_t>(written);
+    offset += written;
+  }
+  return 0;
+}
+
+/// Through a buffer, up to `end` or the end of the file.
+int CopyByReading(int from, int to, off_t offset, off_t end) {
+  std::vector<std::byte> buffer(kBlock);
+  while (offset < end) {
+    const auto wanted = static_cast<std::size_t>(std::min<off_t>(kBlock, end - offset));
+    const ssize_t got = ::pread(from, buffer.data(), wanted, offset);
+    if (got < 0 && errno == EINTR) continue;
+    if (got < 0) return errno;
+    if (got == 0) return 0;
+    if (const int error = WriteAll(to, buffer.data(), static_cast<std::size_t>(got), offset)) {
+      return error;
+    }
+    offset += got;
+  }
+  return 0;
+}
+
+/// Whether the kernel copies between these two files at all.
+bool IsRefusalToCopyInKernel(int error) {
+  return error == EXDEV || error == EINVAL || error == ENOSYS || error == EOPNOTSUPP ||
+         error == EPERM || error == ETXTBSY || error == EBADF;
+}
+
+int CopyRange(int from, int to, off_t offset, off_t end) {
+  while (offset < end) {
+    off_t in = offset;
+    off_t out = offset;
+    const ssize_t copied =
+        ::copy_file_range(from, &in, to, &out, static_cast<std::size_t>(end - offset), 0);
+    if (copied < 0 && errno == EINTR) continue;
+    if (copied < 0) {
+      return IsRefusalToCopyInKernel(errno) ? CopyByReading(from, to, offset, end) : errno;
+    }
+    // Nothing copied is the end of a file that became shorter, or of one whose size lies.
+    if (copied == 0) return CopyByReading(from, to, offset, end);
+    offset += copied;
+  }
+  return 0;
+}
+
+int CopySparse(int from, int to, off_t size) {
+  for (off_t at = 0; at < size;) {
+    const off_t data = ::lseek(from, at, SEEK_DATA);
+    if (data < 0 && errno == ENXIO) break;  // only a hole is left
+    const off_t hole = data < 0 ? -1 : ::lseek(from, data, SEEK_HOLE);
+    if (hole < 0) return CopyRange(from, to, at, size);
+    if (const int error = CopyRange(from, to, data, std::min(hole, size))) return error;
+    at = hole;
+  }
+  return ::ftruncate(to, size) == 0 ? 0 : errno;
+}
+
+bool IsCarried(std::string_view attribute) {
+  // A capability is a privilege like a set-id bit, and a label belongs to the place.
+  return !attribute.starts_with("security.") && !attribute.starts_with("trusted.");
+}
+
+int CopyExtendedAttributes(int from, int to) {
+  const ssize_t length = ::flistxattr(from, nullptr, 0);
+  if (length <= 0) return 0;  // none, or a file system that has none
+  std::vector<char> names(static_cast<std::size_t>(length));
+  const ssize_t got = ::flistxattr(from, names.data(), names.size());
+  if (got < 0) return errno;
+  const char* end = names.data() + got;
+  std::vector<char> value(64 * 1024);  // the kernel's limit
+  for (const char* name = names.data(); name < end; name += std::string_view(name).size() + 1) {
+    if (!IsCarried(name)) continue;
+    const ssize_t size = ::fgetxattr(from, name, value.data(), value.size());
+    if (size < 0) continue;  // taken away meanwhile
+    if (::fsetxattr(to, name, value.data(), static_cast<std::size_t>(size), 0) != 0 &&
+        errno != EOPNOTSUPP && errno != EPERM && errno != EACCES) {
+      return errno;
+    }
+  }
+  return 0;
+}
+
+}  // namespace
+
+int CopyFileBytes(int from, int to, const struct stat& status) {
+  // Files of the kernel's own making say that they are empty.
+  if (status.st_size == 0) return CopyByReading(from, to, 0, static_cast<off_t>(1) << 40);
+  if (status.st_blocks < status.st_size / 512) return CopySparse(from, to, status.st_size);
+  return CopyRange(from, to, 0, status.st_size);
+}
+
+int CopyFileAttributes(int from, int to, const struct stat& status) {
+  if (::fchown(to, status.st_uid, status.st_gid) != 0 && errno != EPERM && errno != EINVAL) {
+    return errno;
+  }
+  if (const int error = CopyExtendedAttributes(from, to)) return error;
+  const mode_t carried = S_ISDIR(status.st_mode) ? 01777 : 0777;
+  if (::fchmod(to, status.st_mode & carried) != 0) return errno;
+  const timespec times[2] = {status.st_atim, status.st_mtim};
+  return ::futimens(to, times) == 0 ? 0 : errno;
+}
+
+}  // namespace platform

@@ -1,0 +1,126 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "Helper/Platform/Linux/FileLocation.h"
+
+#include <fcntl.h>
+#include <linux/openat2.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <string_view>
+#include <utility>
+
+namespace platform {
+namespace {
+
+constexpr int kPathOnly = O_PATH | O_DIRECTORY | O_CLOEXEC;
+
+/// Opens a directory below `root` that no link leads to or away from.
+FileDescriptor OpenBeneath(int root, const std::string& subpath) {
+  open_how how{};
+  how.flags = kPathOnly | O_NOFOLLOW;
+  how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS;
+  return FileDescriptor(
+      static_cast<int>(::syscall(SYS_openat2, root, subpath.c_str(), &how, sizeof how)));
+}
+
+}  // namespace
+
+int Locate(const FilePlace& place, FileLocation& location) {
+  if (place.path.empty()) return kNoErrorObject;
+  if (place.subpath.empty()) {
+    std::string_view path = place.path;
+    while (path.ends_with('/')) path.remove_suffix(1);
+    const std::size_t slash = path.rfind('/');
+    const std::string folder(slash == std::string_view::npos ? (path.empty() ? "/" : ".")
+                                                             : path.substr(0, slash + 1));
+    location.name = slash == std::string_view::npos ? path : path.substr(slash + 1);
+    if (location.name.empty()) location.name = ".";
+    location.folder.reset(::open(folder.c_str(), kPathOnly));
+    return location.folder ? 0 : errno;
+  }
+  FileDescriptor root(::open(place.path.c_str(), kPathOnly));
+  if (!root) return errno;
+  const std::size_t slash = place.subpath.rfind('/');
+  if (slash == std::string::npos) {
+    location = {std::move(root), place.subpath};
+    return 0;
+  }
+  location = {OpenBeneath(root.get(), place.subpath.substr(0, slash)),
+              place.subpath.substr(slash + 1)};
+  return location.folder ? 0 : errno;
+}
+
+int RenameToFreeName(int fromFolder, const char* from, int toFolder, const char* to) {
+  if (::renameat2(fromFolder, from, toFolder, to, RENAME_NOREPLACE) == 0) return 0;
+  if (errno != EINVAL) return errno;
+  // Either the rename is impossible or the file system does not know the flag.
+  struct stat status {};
+  if (::fstatat(toFolder, to, &status, AT_SYMLINK_NOFOLLOW) == 0) return EEXIST;
+  if (errno != ENOENT) return errno;
+  return ::renameat(fromFolder, from, toFolder, to) == 0 ? 0 : errno;
+}
+
+bool IsWithin(int inner, const struct stat& outer) {
+  FileDescriptor at(::openat(inner, ".", kPathOnly));
+  struct stat last {};
+  while (at) {
+    struct stat status {};
+    if (::fstat(at.get(), &status) != 0) return false;
+    if (status.st_dev == outer.st_dev && status.st_ino == outer.st_ino) return true;
+    if (status.st_dev == last.st_dev && status.st_ino == last.st_ino) return false;
+    last = status;
+    at.reset(::openat(at.get(), "..", kPathOnly));
+  }
+  return false;
+}
+
+FileDescriptor OpenFolder(int folder, const char* name) {
+  return FileDescriptor(
+      ::openat(folder, name, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+}
+
+FolderReader::FolderReader(FileDescriptor folder) {
+  if (!folder) return;
+  stream_.reset(::fdopendir(folder.get()));
+  if (stream_) (void)folder.release();  // the stream closes it
+}
+
+const dirent* FolderReader::next() {
+  while (true) {
+    errno = 0;
+    // The stream belongs to this object alone, so the call is safe on any thread.
+    const dirent* entry = ::readdir(stream_.get());  // NOLINT(concurrency-mt-unsafe)
+    if (!entry) {
+      error_ = errno;
+      return nullptr;
+    }
+    const std::string_view name = entry->d_name;
+    if (name != "." && name != "..") return entry;
+  }
+}
+
+int RemoveTree(int folder, const char* name, int level) {
+  if (::unlinkat(folder, name, 0) == 0) return 0;
+  if (errno != EISDIR) return errno;
+  if (level > kDeepestLevel) return ENAMETOOLONG;
+  FolderReader reader(OpenFolder(folder, name));
+  if (!reader) return errno;
+  int first = 0;
+  // A file system may pass over names while others are removed, so an emptied folder is read again.
+  for (bool removed = true; removed && first == 0; reader.rewind()) {
+    removed = false;
+    while (const dirent* entry = reader.next()) {
+      const int error = RemoveTree(reader.descriptor(), entry->d_name, level + 1);
+      removed = removed || error == 0;
+      if (first == 0) first = error;
+    }
+    if (first == 0) first = reader.error();
+  }
+  if (::unlinkat(folder, name, AT_REMOVEDIR) == 0) return 0;
+  return first != 0 ? first : errno;
+}
+
+}  // namespace platform

@@ -1,0 +1,236 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// The file manager on system calls. Every item is reached below an open folder. Any thread; no
+// state.
+#include <fcntl.h>
+#include <grp.h>
+#include <pwd.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <cstdio>
+#include <string_view>
+
+#include "Helper/Platform/FileManager.h"
+#include "Helper/Platform/Linux/FileLocation.h"
+#include "Helper/Platform/Linux/TreeCopy.h"
+
+namespace platform {
+namespace {
+
+/// Turns a code into the answer of an operation.
+bool Answer(int code, FileError* error) {
+  if (code != 0 && code != kNoErrorObject && error) *error = code;
+  return code == 0;
+}
+
+/// What attributes come to when names have become numbers; -1 leaves an id as it is.
+struct Ids {
+  uid_t owner = static_cast<uid_t>(-1);
+  gid_t group = static_cast<gid_t>(-1);
+  [[nodiscard]] bool changeNothing() const { return owner + 1 == 0 && group + 1 == 0; }
+};
+
+int ResolveIds(const FileAttributes& attributes, Ids& ids) {
+  if (attributes.ownerId) ids.owner = *attributes.ownerId;
+  if (attributes.groupId) ids.group = *attributes.groupId;
+  std::array<char, 16 * 1024> buffer;
+  if (!attributes.ownerName.empty()) {
+    passwd entry{};
+    passwd* found = nullptr;
+    (void)::getpwnam_r(attributes.ownerName.c_str(), &entry, buffer.data(), buffer.size(), &found);
+    if (!found) return EINVAL;
+    ids.owner = found->pw_uid;
+  }
+  if (!attributes.groupName.empty()) {
+    group entry{};
+    group* found = nullptr;
+    (void)::getgrnam_r(attributes.groupName.c_str(), &entry, buffer.data(), buffer.size(), &found);
+    if (!found) return EINVAL;
+    ids.group = found->gr_gid;
+  }
+  return 0;
+}
+
+/// Owner before permissions: a change of owner takes set-id bits away.
+int ApplyTo(int folder, const char* name, const Ids& ids,
+            std::optional<std::uint32_t> permissions) {
+  if (!ids.changeNothing() &&
+      ::fchownat(folder, name, ids.owner, ids.group, AT_SYMLINK_NOFOLLOW) != 0) {
+    return errno;
+  }
+  if (!permissions) {
+    struct stat status {};
+    return ::fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW) == 0 ? 0 : errno;
+  }
+  const FileDescriptor item(::openat(folder, name, O_PATH | O_NOFOLLOW | O_CLOEXEC));
+  struct stat status {};
+  if (!item || ::fstat(item.get(), &status) != 0) return errno;
+  if (S_ISLNK(status.st_mode)) return 0;
+  // The only way to change the mode of what must not be opened for reading.
+  const std::string path = "/proc/self/fd/" + std::to_string(item.get());
+  return ::chmod(path.c_str(), *permissions & 07777) == 0 ? 0 : errno;
+}
+
+/// Makes one directory in full, or leaves nothing.
+int MakeFolder(int folder, const char* name, const Ids& ids,
+               std::optional<std::uint32_t> permissions) {
+  // Nobody else gets in before it has its attributes.
+  if (::mkdirat(folder, name, permissions ? 0700 : 0777) != 0) return errno;
+  if (!permissions && ids.changeNothing()) return 0;
+  const int error = ApplyTo(folder, name, ids, permissions);
+  if (error != 0) ::unlinkat(folder, name, AT_REMOVEDIR);
+  return error;
+}
+
+/// Opens the directory that a text of components leads to, making what is missing.
+int MakeFolders(FileDescriptor& at, std::string_view components, bool followLinks, const Ids& ids,
+                std::optional<std::uint32_t> permissions) {
+  const int flags = O_PATH | O_DIRECTORY | O_CLOEXEC | (followLinks ? 0 : O_NOFOLLOW);
+  while (true) {
+    const std::size_t start = components.find_first_not_of('/');
+    if (start == std::string_view::npos) return 0;
+    components.remove_prefix(start);
+    const std::string name(components.substr(0, components.find('/')));
+    components.remove_prefix(name.size());
+    FileDescriptor next(::openat(at.get(), name.c_str(), flags));
+    if (!next && errno == ENOENT) {
+      const int error = MakeFolder(at.get(), name.c_str(), ids, permissions);
+      // Another process may have made it first.
+      if (error != 0 && error != EEXIST) return error;
+      next.reset(::openat(at.get(), name.c_str(), flags));
+      // A link to nothing can neither be entered nor made.
+      if (!next && errno == ENOENT) return EEXIST;
+    }
+    if (!next) return errno;
+    at = std::move(next);
+  }
+}
+
+void ListBelow(FolderReader& reader, const std::string& prefix, int level,
+               std::vector<std::string>& names) {
+  while (const dirent* entry = reader.next()) {
+    names.push_back(prefix + entry->d_name);
+    if ((entry->d_type != DT_DIR && entry->d_type != DT_UNKNOWN) || level >= kDeepestLevel) {
+      continue;
+    }
+    FolderReader below(OpenFolder(reader.descriptor(), entry->d_name));
+    if (below) ListBelow(below, std::string(names.back()) + '/', level + 1, names);
+  }
+}
+
+class FileManagerPosix final : public FileManager {
+ public:
+  FileKind kind(const FilePlace& place) override {
+    struct stat status {};
+    if (place.subpath.empty()) {
+      if (::stat(place.path.c_str(), &status) != 0) return FileKind::kAbsent;
+    } else {
+      FileLocation at;
+      if (Locate(place, at) != 0) return FileKind::kAbsent;
+      if (::fstatat(at.folder.get(), at.name.c_str(), &status, 0) != 0) return FileKind::kAbsent;
+    }
+    return S_ISDIR(status.st_mode) ? FileKind::kDirectory : FileKind::kOther;
+  }
+
+  std::optional<std::uint32_t> mode(const std::string& path) override {
+    struct stat status {};
+    if (::stat(path.c_str(), &status) != 0) return std::nullopt;
+    return status.st_mode;
+  }
+
+  std::vector<std::string> subpaths(const std::string& path) override {
+    std::vector<std::string> names;
+    FolderReader reader(
+        FileDescriptor(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NONBLOCK | O_CLOEXEC)));
+    if (reader) ListBelow(reader, "", 0, names);
+    return names;
+  }
+
+  bool createDirectory(const FilePlace& place, bool intermediates, const FileAttributes& attributes,
+                       FileError* error) override {
+    if (place.path.empty()) return Answer(kNoErrorObject, error);
+    Ids ids;
+    if (const int code = ResolveIds(attributes, ids)) return Answer(code, error);
+    if (!intermediates) {
+      FileLocation at;
+      int code = Locate(place, at);
+      if (code == 0) {
+        code = MakeFolder(at.folder.get(), at.name.c_str(), ids, attributes.permissions);
+      }
+      return Answer(code, error);
+    }
+    const char* start = place.path.starts_with('/') ? "/" : ".";
+    FileDescriptor at(::open(start, O_PATH | O_DIRECTORY | O_CLOEXEC));
+    if (!at) return Answer(errno, error);
+    int code = MakeFolders(at, place.path, /*followLinks=*/true, ids, attributes.permissions);
+    if (code == 0) {
+      code = MakeFolders(at, place.subpath, /*followLinks=*/false, ids, attributes.permissions);
+    }
+    // What stands in the way is there already, as another kind of thing.
+    return Answer(code == ENOTDIR ? EEXIST : code, error);
+  }
+
+  bool copyItem(const FilePlace& source, const FilePlace& destination, FileError* error) override {
+    FileLocation from;
+    FileLocation to;
+    int code = Locate(source, from);
+    if (code == 0) code = Locate(destination, to);
+    if (code == 0) code = CopyTree(from, to, CopyRule::kSkipWhatFails);
+    return Answer(code, error);
+  }
+
+  bool moveItem(const FilePlace& source, const FilePlace& destination, FileError* error) override {
+    FileLocation from;
+    FileLocation to;
+    int code = Locate(source, from);
+    if (code == 0) code = Locate(destination, to);
+    if (code == 0) code = move(from, to);
+    return Answer(code, error);
+  }
+
+  bool removeItem(const FilePlace& place, FileError* error) override {
+    FileLocation at;
+    int code = Locate(place, at);
+    if (code == 0 && (at.name == "." || at.name == "..")) code = EINVAL;
+    if (code == 0) code = RemoveTree(at.folder.get(), at.name.c_str());
+    return Answer(code, error);
+  }
+
+  bool removeEmptyDirectory(const std::string& path) override { return ::rmdir(path.c_str()) == 0; }
+
+  bool setAttributes(const FileAttributes& attributes, const FilePlace& place,
+                     FileError* error) override {
+    Ids ids;
+    FileLocation at;
+    int code = Locate(place, at);
+    if (code == 0) code = ResolveIds(attributes, ids);
+    if (code == 0) code = ApplyTo(at.folder.get(), at.name.c_str(), ids, attributes.permissions);
+    return Answer(code, error);
+  }
+
+  bool changeOwner(const std::string& path, std::uint32_t uid, std::uint32_t gid) override {
+    return ::chown(path.c_str(), uid, gid) == 0;
+  }
+
+ private:
+  static int move(const FileLocation& from, const FileLocation& to) {
+    const int error =
+        RenameToFreeName(from.folder.get(), from.name.c_str(), to.folder.get(), to.name.c_str());
+    if (error != EXDEV) return error;
+    if (const int copying = CopyTree(from, to, CopyRule::kAllOrNothing)) return copying;
+    return RemoveTree(from.folder.get(), from.name.c_str());
+  }
+};
+
+}  // namespace
+
+template <>
+FileManager& DefaultProvider<FileManager>() {
+  static FileManagerPosix manager;
+  return manager;
+}
+
+}  // namespace platform
