@@ -2,10 +2,11 @@
 //
 // Starting, and doing nothing.
 #include <sys/socket.h>
-#include <unistd.h>
 
 #include <array>
+#include <chrono>
 #include <string>
+#include <thread>
 #include <utility>
 
 #include "Benchmarks/Daemon/Helper.h"
@@ -73,8 +74,7 @@ Table MeasureRest() {
                            {},
                            kMemoryGoal});
   const double before = SleepsOf(helper);
-  constexpr unsigned kSeconds = 10;
-  (void)::sleep(kSeconds);
+  std::this_thread::sleep_for(std::chrono::seconds(10));
   table.figures.push_back({"wake-ups in 10 s", SleepsOf(helper) - before, {}, 0.0});
   return table;
 }

@@ -235,6 +235,7 @@ std::unique_ptr<Driver> StartPeerToPeer(const Placement& placement, std::size_t 
   Child server(placement.server, [&] { ServeSockets(std::move(servers)); });
   servers.clear();
   std::vector<BusPointer> buses;
+  buses.reserve(clients.size());
   for (FileDescriptor& socket : clients) buses.push_back(OpenSocket(std::move(socket), false));
   return std::make_unique<BusDriver>(Child(), std::move(server), std::move(buses), nullptr);
 }
