@@ -20,7 +20,7 @@ constexpr int kPathOnly = O_PATH | O_DIRECTORY | O_CLOEXEC;
 /// Opens a directory below `root` that no link leads to or away from.
 FileDescriptor OpenBeneath(int root, const std::string& subpath) {
   open_how how{};
-  how.flags = kPathOnly | O_NOFOLLOW;
+  how.flags = kPathOnly;
   how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS;
   return FileDescriptor(
       static_cast<int>(::syscall(SYS_openat2, root, subpath.c_str(), &how, sizeof how)));
