@@ -7,6 +7,7 @@
 #include <string>
 
 #include "Helper/Files/DictionaryFile.h"
+#include "Helper/Files/FileUtilities.h"
 #include "Helper/Platform/SystemLog.h"
 #include "Helper/Platform/TaskMemory.h"
 #include "Helper/Shared/Server/RequestRoutines.h"
@@ -21,6 +22,7 @@ KernReturn server_HvMobileHelperCopyPropertyListFile(PortName /*port*/, wire::Te
   *byteCount = 0;
   const std::string pathText(path.view());
   Log(LogPriority::kInfo, "Loading %s as plist", pathText.c_str());
+  const ReleasePoolScope pool;
   const std::optional<platform::PropertyList> dictionary =
       CreateDictionaryFromFile(pathText.c_str());
   const std::optional<std::string> content =

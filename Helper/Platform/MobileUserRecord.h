@@ -14,7 +14,12 @@ namespace platform {
 
 class MobileUserRecord {
  public:
-  /// The home directory, valid for the life of the process; null when there is none.
+  MobileUserRecord() = default;
+  MobileUserRecord(const MobileUserRecord&) = delete;
+  MobileUserRecord& operator=(const MobileUserRecord&) = delete;
+  ~MobileUserRecord() { DefaultAllocator().deallocate(directory_); }
+
+  /// The home directory, valid while the record lives; null when there is none.
   [[nodiscard]] const char* directory() {
     fillOnce();
     return directory_;
@@ -37,12 +42,12 @@ class MobileUserRecord {
 
   std::once_flag once_;  // guards what follows
   String userName_{"mobile"};
-  char* directory_ = nullptr;  // allocated once, never freed: callers keep the pointer
+  char* directory_ = nullptr;  // from the default allocator
   uid_t uid_ = 0;
   gid_t gid_ = 0;
 };
 
-/// The record of this process.
+/// The record of this process, which lives as long as the process.
 [[nodiscard]] MobileUserRecord& MobileUser();
 
 }  // namespace platform
