@@ -42,6 +42,30 @@ TEST_F(Links, InTheHomeOfTheUserDatabaseAreAllowedButNotTheSecondCarriersFile) {
       << outcome.errors;
 }
 
+TEST_F(Links, FollowTheHomeThatTheUserDatabaseGaveAtTheStart) {
+  const Outcome outcome =
+      run("mkdir -p /tmp/home/Library /var/mobile/Library\n"
+          "sed -i 's#:/var/mobile:#:/tmp/home:#' /etc/passwd\n"
+          "for home in /tmp/home /var/mobile /private/var/mobile; do\n"
+          "  halvecctl call SetCarrierBundleLink t $home/Library/CarrierDefault.bundle ''\n"
+          "  sed -i 's#:/tmp/home:#:/var/mobile:#' /etc/passwd\n"
+          "done");
+  EXPECT_EQ(outcome.output,
+            "code 0 (KERN_SUCCESS)\ncode 8 (KERN_NO_ACCESS)\ncode 0 (KERN_SUCCESS)\n")
+      << outcome.errors;
+}
+
+TEST_F(Links, WithoutAMobileUserGoBelowTheRoot) {
+  const Outcome outcome =
+      run("sed -i '/^mobile:/d' /etc/passwd; halvecctl path explain /Library/Carrier\\ Bundles/x\n"
+          "halvecctl call RemoveCarrierBundleLink '/Library/Carrier Bundles/absent' ''");
+  EXPECT_EQ(outcome.output,
+            "link there:             refused: is not on the list\n"
+            "remove or place there:  allowed: begins with the user's carrier-bundles directory "
+            "/Library/Carrier Bundles/\ncode 5 (KERN_FAILURE)\n")
+      << outcome.errors;
+}
+
 TEST_F(Links, OverADirectoryAreRefusedWithCode8AndALine) {
   const Outcome outcome = run(kInLibrary +
                               "mkdir \"$link\"; halvecctl call SetCarrierBundleLink t \"$link\" d\n"
