@@ -43,14 +43,15 @@ TEST(HalvecctlList, TakesGlobalOptionsBeforeTheCommandToo) {
 TEST(HalvecctlHelp, NamesEveryCommandAndExitCode) {
   const Outcome outcome = RunProgram({"--help"});
   EXPECT_EQ(outcome.exitCode, 0);
-  for (const char* text : {"list ", "preference ", "bundle ", "path ", "plist ", "call ",
-                           "--timeout", "  6  the preference"}) {
+  for (const char* text : {"list ", "preference ", "bundle ", "path ", "plist ", "file ",
+                           "crash-logs ", "call ", "--timeout", "  6  the preference"}) {
     EXPECT_NE(outcome.output.find(text), std::string::npos) << text;
   }
 }
 
 TEST(HalvecctlHelp, ExistsForEveryCommand) {
-  for (const char* command : {"list", "preference", "bundle", "path", "plist", "call"}) {
+  for (const char* command :
+       {"list", "preference", "bundle", "path", "plist", "file", "crash-logs", "call"}) {
     const Outcome outcome = RunProgram({command, "--help"});
     EXPECT_EQ(outcome.exitCode, 0);
     EXPECT_EQ(outcome.output.find("Usage: halvecctl " + std::string(command)), 0U);
@@ -93,7 +94,7 @@ TEST(HalvecctlUsage, ErrorsAreOneSentenceAndExitWithTwo) {
       {{"call", "SetPreferenceValue", "d", "k", "text"}, "neither @FILE nor -"},
       {{"call", "SetPreferenceValue", "d", "k", "@/nonexistent"}, "cannot open /nonexistent"},
       {{"call", "SetPreferenceValue", "d", "k", "@/"}, "cannot read /"},
-      {{"bundle"}, "expected link or unlink"},
+      {{"bundle"}, "expected link, unlink or move"},
       {{"bundle", "mend"}, "unknown action 'mend'"},
       {{"bundle", "link", "target"}, "expected TARGET LINK-PATH, got 1 argument"},
       {{"bundle", "link", "t", "p", "--unchecked", "--domain", "d"}, "exclude one another"},
@@ -106,6 +107,13 @@ TEST(HalvecctlUsage, ErrorsAreOneSentenceAndExitWithTwo) {
       {{"plist"}, "expected show"},
       {{"plist", "hide"}, "unknown action 'hide'"},
       {{"plist", "show"}, "expected PATH, got 0 arguments"},
+      {{"bundle", "move", "s", "d"}, "expected SOURCE DESTINATION-DIRECTORY NAME, got 2"},
+      {{"file"}, "expected copy"},
+      {{"file", "link"}, "unknown action 'link'"},
+      {{"file", "copy", "s", "d"}, "DESTINATION-DIRECTORY FILE-NAME, got 2 arguments"},
+      {{"crash-logs"}, "expected copy"},
+      {{"crash-logs", "move"}, "unknown action 'move'"},
+      {{"crash-logs", "copy"}, "expected SOURCE, got 0 arguments"},
       {{"preference"}, "expected set, get or remove"},
       {{"preference", "list"}, "unknown action 'list'"},
       {{"preference", "set", "d", "k"}, "expected DOMAIN KEY VALUE, got 2 arguments"},

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// halvecctl bundle: the links by which the mobile user's library points at carrier bundles.
+// halvecctl bundle: the links by which the mobile user's library points at carrier bundles, and the
+// bundles themselves.
 #include <cstdio>
 #include <optional>
 #include <string>
@@ -45,19 +46,29 @@ ExitCode RunUnlink(const GlobalOptions& options, Words words) {
       options);
 }
 
+ExitCode RunMove(const GlobalOptions& options, Words words) {
+  const std::vector<std::string> texts = words.takeAll(3, "SOURCE DESTINATION-DIRECTORY NAME");
+  halvec::HelperClient client = Connect(options);
+  return FinishWithFlag(client.call<requests::MoveCarrierBundles>(texts[0], texts[1], texts[2]),
+                        options);
+}
+
 ExitCode RunBundle(const GlobalOptions& options, Words words) {
   const std::optional<std::string> action = words.takeFirst();
-  if (!action) throw UsageFailure("expected link or unlink; see halvecctl bundle --help");
+  if (!action) throw UsageFailure("expected link, unlink or move; see halvecctl bundle --help");
   if (*action == "link") return RunLink(options, std::move(words));
   if (*action == "unlink") return RunUnlink(options, std::move(words));
+  if (*action == "move") return RunMove(options, std::move(words));
   throw UsageFailure("unknown action '" + *action + "'; see halvecctl bundle --help");
 }
 
 }  // namespace
 
 constinit const Command kBundleCommand{
-    "bundle", "link TARGET LINK-PATH [OPTION...] | unlink PATH [--domain DOMAIN]",
-    "point a carrier-bundle link at a target, or remove it",
+    "bundle",
+    "link TARGET LINK-PATH [OPTION...] | unlink PATH [--domain DOMAIN] | "
+    "move SOURCE DESTINATION-DIRECTORY NAME",
+    "point a carrier-bundle link at a target, remove it, or move a bundle",
     "link     replaces what stands at LINK-PATH by a symbolic link to TARGET. LINK-PATH must be "
     "on\n"
     "         the helper's list; halvecctl path explain tells.\n"
@@ -66,7 +77,11 @@ constinit const Command kBundleCommand{
     "unlink   removes a file, a link or an empty directory at an allowed path.\n"
     "           --domain DOMAIN  before, forget the cached copy of this preference domain; this\n"
     "                            happens also when the path is then refused\n"
-    "A path that is not allowed is answered with code 8.\n",
+    "move     moves the bundle SOURCE to DESTINATION-DIRECTORY/NAME, where nothing may stand, and\n"
+    "         gives all of it to the helper's own user. The directory is made where it is "
+    "missing,\n"
+    "         also when the place is then refused.\n"
+    "A path of a link that is not allowed is answered with code 8.\n",
     RunBundle};
 
 }  // namespace halvecctl

@@ -27,10 +27,16 @@ extern const Command kPreferenceCommand;
 extern const Command kBundleCommand;
 extern const Command kPathCommand;
 extern const Command kPlistCommand;
+extern const Command kFileCommand;
+extern const Command kCrashLogsCommand;
 extern const Command kCallCommand;
 
 /// Every command, in the order of --help.
 [[nodiscard]] std::span<const Command* const> Commands();
+
+/// Ends a command whose request answers with a success flag: throws Failure where it is false.
+[[nodiscard]] ExitCode FinishWithFlag(const halvec::Result<bool>& success,
+                                      const GlobalOptions& options);
 
 /// A connection as the options ask for it. Throws Failure without one.
 [[nodiscard]] halvec::HelperClient Connect(const GlobalOptions& options);

@@ -87,8 +87,9 @@ void FlushOutput() {
 }  // namespace
 
 std::span<const Command* const> Commands() {
-  static constexpr std::array kCommands{&kListCommand, &kPreferenceCommand, &kBundleCommand,
-                                        &kPathCommand, &kPlistCommand,      &kCallCommand};
+  static constexpr std::array kCommands{&kListCommand,      &kPreferenceCommand, &kBundleCommand,
+                                        &kPathCommand,      &kPlistCommand,      &kFileCommand,
+                                        &kCrashLogsCommand, &kCallCommand};
   return kCommands;
 }
 
