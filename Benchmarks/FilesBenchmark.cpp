@@ -1,0 +1,172 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// FilesBenchmark: copies, merges and changes of owner beside cp and chown, turn by turn. One
+// thread. FilesBenchmark [--json] [FOLDER]; needs 3 GiB in FOLDER (the folder for temporary files)
+// and, for owners, root.
+#include <fcntl.h>
+#include <spawn.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <filesystem>
+#include <fstream>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "Benchmarks/Support/Measure.h"
+#include "Benchmarks/Support/Report.h"
+#include "Helper/Files/FileUtilities.h"
+
+namespace {
+
+namespace fs = std::filesystem;
+using bench::Fail;
+using bench::MicrosecondsOf;
+using platform::FileManager;
+
+constexpr int kFolders = 100;
+constexpr int kFilesPerFolder = 100;
+
+void Run(std::vector<std::string> words) {
+  std::vector<char*> arguments;
+  for (std::string& word : words) arguments.push_back(word.data());
+  arguments.push_back(nullptr);
+  pid_t child = -1;
+  int status = -1;
+  if (::posix_spawnp(&child, arguments[0], nullptr, nullptr, arguments.data(), environ) != 0 ||
+      ::waitpid(child, &status, 0) != child || status != 0) {
+    Fail(words[0].c_str());
+  }
+}
+
+void MakeTree(const fs::path& root) {
+  for (int i = 0; i < kFolders; ++i) {
+    const fs::path folder = root / ("folder" + std::to_string(i));
+    fs::create_directories(folder);
+    for (int k = 0; k < kFilesPerFolder; ++k) {
+      std::ofstream(folder / ("file" + std::to_string(k)))
+          << std::string(static_cast<std::size_t>(100 + (k * 37) % 4000), 'x');
+    }
+  }
+}
+
+FileManager& Manager() { return platform::Shared<FileManager>(); }
+
+void Require(bool good, const char* what) {
+  if (!good) Fail(what);
+}
+
+/// Runs both in turn, each after `prepare`, and adds the comparison; the peer is 1.00.
+template <class Ours, class Theirs, class Prepare>
+bench::Table Compare(const char* title, const char* peer, double goal, int turns, Prepare prepare,
+                     Ours ours, Theirs theirs) {
+  std::vector<double> our, their;
+  for (int turn = 0; turn < turns; ++turn) {
+    // Who goes first changes, so that neither always finds the other's leavings.
+    for (int step = 0; step < 2; ++step) {
+      prepare();
+      ::sync();
+      if ((turn + step) % 2 == 0) {
+        our.push_back(MicrosecondsOf(ours) / 1000);
+      } else {
+        their.push_back(MicrosecondsOf(theirs) / 1000);
+      }
+    }
+  }
+  return {.title = title,
+          .unit = "ms",
+          .figures = {{peer, bench::Median(their), 1.0, {}},
+                      {"ours", bench::Median(our), bench::PairedRatio(our, their), goal}},
+          .notes = {}};
+}
+
+bench::Table CopyTree(const fs::path& root) {
+  const std::string from = root / "tree";
+  const std::string to = root / "copy";
+  return Compare(
+      "Copy a tree of 10,000 small files", "cp -a", 0.75, 7, [&] { fs::remove_all(to); },
+      [&] { Require(Manager().copyItem(from, to, nullptr), "copy"); },
+      [&] {
+        Run({"cp", "-a", from, to});
+      });
+}
+
+bench::Table CopyLargeFile(const fs::path& root) {
+  const std::string from = root / "large";
+  const std::string to = root / "large-copy";
+  {
+    std::ofstream file(from, std::ios::binary);
+    const std::string block(1 << 20, 'x');
+    for (int i = 0; i < 1024; ++i) file << block;
+    file.close();
+    Require(file.good(), "write 1 GiB");
+  }
+  bench::Table table = Compare(
+      "Copy a file of 1 GiB", "cp -a", 1.0, 5, [&] { fs::remove(to); },
+      [&] { Require(Manager().copyItem(from, to, nullptr), "copy"); },
+      [&] {
+        Run({"cp", "-a", from, to});
+      });
+  fs::remove(from);
+  fs::remove(to);
+  return table;
+}
+
+bench::Table ChangeOwners(const fs::path& root) {
+  const std::string tree = root / "tree";
+  std::uint32_t id = 501;
+  return Compare(
+      "Give a tree of 10,000 files to another owner", "chown -R", 1.0, 15, [&] { id ^= 1; },
+      [&] { Require(SetItemOwner(tree.c_str(), id, id, true) == 0, "change the owner"); },
+      [&] {
+        Run({"chown", "-R", std::to_string(id) + ":" + std::to_string(id), tree});
+      });
+}
+
+bench::Table Merge(const fs::path& root) {
+  const std::string from = root / "tree";
+  const std::string into = root / "merged";
+  bench::Table table = Compare(
+      "Merge a tree into one with the same 10,000 names", "cp -aT --remove-destination", 1.0, 5,
+      [&] {
+        fs::remove_all(into);
+        Run({"cp", "-a", from, into});
+      },
+      [&] { MergeItem(Manager(), from, into, /*copy=*/true); },
+      [&] {
+        Run({"cp", "-aT", "--remove-destination", from, into});
+      });
+  fs::remove_all(into);
+  return table;
+}
+
+}  // namespace
+
+int main(int count, char** arguments) {
+  bool json = false;
+  fs::path base = fs::temp_directory_path();
+  for (int i = 1; i < count; ++i) {
+    if (std::string_view(arguments[i]) == "--json") {
+      json = true;
+    } else {
+      base = arguments[i];
+    }
+  }
+  std::string name = base / "files-benchmark-XXXXXX";
+  if (::mkdtemp(name.data()) == nullptr) Fail("make a folder");
+  const fs::path root = name;
+  (void)bench::TakePrecedence();
+  bench::Report report(json);
+  MakeTree(root / "tree");
+  report.add(CopyTree(root));
+  fs::remove_all(root / "copy");
+  report.add(Merge(root));
+  if (::geteuid() == 0) report.add(ChangeOwners(root));
+  report.add(CopyLargeFile(root));
+  report.finish();
+  fs::remove_all(root);
+  return 0;
+}
