@@ -73,7 +73,13 @@ class ReceiveBuffer {
   SharedDescriptor sender_;  // pidfd of the sender; only on named ports
   std::array<PortName, kMaxRights> rights_{};
   std::size_t rightCount_ = 0;
-  std::vector<std::vector<std::byte>> memory_;  // what came in memfds
+  /// What came in a memfd. The file stays open until the reply is out: who closes the last
+  /// descriptor frees the pages, and the client need not wait for that.
+  struct Memory {
+    std::unique_ptr<std::byte[]> bytes;
+    FileDescriptor file;
+  };
+  std::vector<Memory> memory_;
 };
 
 /// Sends the message at `message` (its header's size counts) to `socket`. A port descriptor's name

@@ -24,17 +24,17 @@ std::uint32_t AlignedTrailerOffset(std::uint32_t size) { return (size + 3U) & ~3
 
 /// Reads a whole sealed memfd. pread leaves the sender's file offset alone, and a copy in own
 /// memory cannot fault or change.
-bool ReadSealed(int descriptor, std::vector<std::byte>& memory, std::size_t size) {
+bool ReadSealed(int descriptor, std::unique_ptr<std::byte[]>& memory, std::size_t size) {
   struct stat status {};
   if (::fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode)) return false;
   const int seals = ::fcntl(descriptor, F_GET_SEALS);
   if (seals < 0 || (seals & kRequiredSeals) != kRequiredSeals) return false;
   if (status.st_size < 0 || static_cast<std::size_t>(status.st_size) != size) return false;
-  memory.resize(size);
+  memory = std::make_unique_for_overwrite<std::byte[]>(size);
   std::size_t done = 0;
   while (done < size) {
     const ssize_t count =
-        ::pread(descriptor, memory.data() + done, size - done, static_cast<off_t>(done));
+        ::pread(descriptor, memory.get() + done, size - done, static_cast<off_t>(done));
     if (count <= 0) return false;
     done += static_cast<std::size_t>(count);
   }
@@ -208,9 +208,10 @@ bool ReceiveBuffer::readMemory(std::byte* descriptor, std::size_t& inlineAt, std
   const std::byte* bytes = nullptr;
   if (size > kMaxOutOfLineData || place > 1) return false;
   if (place == 1 && size > 0) {
-    const FileDescriptor file = control.take();
-    if (!file || !ReadSealed(file.get(), memory_.emplace_back(), size)) return false;
-    bytes = memory_.back().data();
+    Memory& memory = memory_.emplace_back();
+    memory.file = control.take();
+    if (!memory.file || !ReadSealed(memory.file.get(), memory.bytes, size)) return false;
+    bytes = memory.bytes.get();
   } else if (size > 0) {
     if (size > length - inlineAt) return false;
     bytes = message_ + inlineAt;

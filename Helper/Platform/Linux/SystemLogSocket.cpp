@@ -31,13 +31,12 @@ bool SystemLogSocket::connect() {
   address.sun_family = AF_UNIX;
   if (path_.size() >= sizeof address.sun_path) return false;
   std::memcpy(address.sun_path, path_.data(), path_.size());
-  socket_.reset(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  if (!socket_) return false;
-  if (::connect(socket_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
-    socket_.reset();
-    return false;
-  }
-  return true;
+  // The socket is kept where no daemon listens: making one anew for every lost line would cost more
+  // than the line.
+  if (!socket_) socket_.reset(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  connected_ = socket_ && ::connect(socket_.get(), reinterpret_cast<const sockaddr*>(&address),
+                                    sizeof address) == 0;
+  return connected_;
 }
 
 int SystemLogSocket::send(std::string_view head, std::string_view text) const {
@@ -79,7 +78,7 @@ void SystemLogSocket::write(LogPriority priority, std::string_view text) {
       static_cast<int>(stamp.size()), stamp.data(), ::getpid());
   const std::string_view head(buffer.data(), static_cast<std::size_t>(std::max(length, 0)));
 
-  if (!socket_ && !connect()) return;
+  if (!connected_ && !connect()) return;
   int error = send(head, text);
   if (error == EMSGSIZE) {
     text = text.substr(0, kLongestCutText);

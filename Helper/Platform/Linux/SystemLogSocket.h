@@ -39,6 +39,7 @@ class SystemLogSocket final : public SystemLog {
   FileDescriptor socket_;
   bool dropping_ = false;
   std::time_t stampedSecond_ = -1;
+  bool connected_ = false;
   std::array<char, 64> stamp_{};
   std::size_t stampLength_ = 0;
 };

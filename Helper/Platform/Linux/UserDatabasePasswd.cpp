@@ -1,10 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// The user database through getpwnam_r(3), whatever sources the system configures behind it. Any
-// thread; no state.
+// The user database: /etc/passwd itself, then getpwnam_r(3) with whatever sources the system
+// configures behind it. Any thread; no state.
 #include <pwd.h>
 
 #include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -13,20 +16,39 @@
 namespace platform {
 namespace {
 
+struct FileCloser {
+  void operator()(std::FILE* file) const { (void)std::fclose(file); }  // only read
+};
+
+/// Finds `name` in /etc/passwd, where system accounts are: the database's other sources are modules
+/// whose loading would cost every start of the helper more than all the rest of it.
+bool FindInFile(const char* name, passwd& record, std::vector<char>& storage) {
+  const std::unique_ptr<std::FILE, FileCloser> file(std::fopen("/etc/passwd", "re"));
+  passwd* found = nullptr;
+  while (file && ::fgetpwent_r(file.get(), &record, storage.data(), storage.size(), &found) == 0) {
+    if (std::strcmp(found->pw_name, name) == 0) return true;
+  }
+  return false;
+}
+
+bool FindAnywhere(const char* name, passwd& record, std::vector<char>& storage) {
+  constexpr std::size_t kLargestRecord = std::size_t{1} << 20;
+  for (;;) {
+    passwd* found = nullptr;
+    const int error = ::getpwnam_r(name, &record, storage.data(), storage.size(), &found);
+    if (error == 0) return found != nullptr;
+    if (error == EINTR) continue;
+    if (error != ERANGE || storage.size() >= kLargestRecord) return false;
+    storage.resize(storage.size() * 2);
+  }
+}
+
 /// Runs `use` on the record of `name`, if there is one.
 template <class Use>
 void WithRecord(const char* name, const Use& use) {
-  constexpr std::size_t kLargestRecord = std::size_t{1} << 20;
-  std::vector<char> storage(1024);
-  for (;;) {
-    passwd record{};
-    passwd* found = nullptr;
-    const int error = ::getpwnam_r(name, &record, storage.data(), storage.size(), &found);
-    if (error == 0 && found) use(*found);
-    if (error == EINTR) continue;
-    if (error != ERANGE || storage.size() >= kLargestRecord) return;
-    storage.resize(storage.size() * 2);
-  }
+  std::vector<char> storage(4096);
+  passwd record{};
+  if (FindInFile(name, record, storage) || FindAnywhere(name, record, storage)) use(record);
 }
 
 class PasswdDatabase final : public UserDatabase {
