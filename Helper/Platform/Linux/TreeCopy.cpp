@@ -32,7 +32,7 @@ int CopyLink(int fromFolder, const char* from, int toFolder, const char* to,
   target[static_cast<std::size_t>(length)] = '\0';
   if (::symlinkat(target.data(), toFolder, to) != 0) return errno;
   // Nothing depends on a link's owner and times: what cannot be kept is let go.
-  (void)::fchownat(toFolder, to, status.st_uid, status.st_gid, AT_SYMLINK_NOFOLLOW);
+  (void)!::fchownat(toFolder, to, status.st_uid, status.st_gid, AT_SYMLINK_NOFOLLOW);
   const timespec times[2] = {status.st_atim, status.st_mtim};
   (void)::utimensat(toFolder, to, times, AT_SYMLINK_NOFOLLOW);
   return 0;
@@ -115,7 +115,7 @@ class TreeCopy {
 std::string FreeName() {
   std::uint64_t number = 0;
   // Should there be no randomness yet, the exclusive creation still protects what is there.
-  (void)::getrandom(&number, sizeof number, GRND_NONBLOCK);
+  (void)!::getrandom(&number, sizeof number, GRND_NONBLOCK);
   std::array<char, 32> name;
   std::snprintf(name.data(), name.size(), ".copy-%016llx", static_cast<unsigned long long>(number));
   return name.data();
