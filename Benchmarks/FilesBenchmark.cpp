@@ -158,7 +158,6 @@ int main(int count, char** arguments) {
   std::string name = base / "files-benchmark-XXXXXX";
   if (::mkdtemp(name.data()) == nullptr) Fail("make a folder");
   const fs::path root = name;
-  (void)bench::TakePrecedence();
   bench::Report report(json);
   MakeTree(root / "tree");
   report.add(CopyTree(root));

@@ -82,13 +82,11 @@ std::int32_t SetAttributesRecursively(const char* path, const FileAttributes& at
   FileError error;
   std::int32_t last = 0;
   if (kind == FileKind::kDirectory) {
-    for (std::string& subpath : manager.subpaths(root)) {
-      // Kept: nothing clears the slot, so a failure without an error object of its own counts with
-      // the one before it.
-      if (!manager.setAttributes(attributes, {root, std::move(subpath)}, &error) && error) {
-        last = *error;
-      }
-    }
+    // Kept: nothing clears the slot, so a failure without an error object of its own counts with
+    // the one before it.
+    manager.setAttributesBelow(root, manager.subpaths(root), attributes, &error, [&](bool done) {
+      if (!done && error) last = *error;
+    });
   }
   if (!manager.setAttributes(attributes, root, &error) && error) return *error;
   return last;
@@ -158,6 +156,7 @@ void MergeItem(FileManager& manager, const std::string& source, const std::strin
   FileError error;
   if (CopyOrMove(manager, source, destination, copy, copy ? &error : nullptr)) return;
   if (manager.kind(source) == FileKind::kOther) return;
+  std::optional<std::string> made;
   for (const std::string& subpath : manager.subpaths(source)) {
     const FilePlace from{source, subpath};
     const FilePlace to{destination, subpath};
@@ -165,8 +164,13 @@ void MergeItem(FileManager& manager, const std::string& source, const std::strin
       (void)manager.removeItem(to, nullptr);
     }
     // It is there already, as a rule; and where it cannot be made the item itself fails.
-    (void)manager.createDirectory(ParentOf(destination, subpath), /*intermediates=*/true, {},
-                                  nullptr);
+    const FilePlace parent = ParentOf(destination, subpath);
+    if (made != parent.subpath) {
+      made.reset();
+      if (manager.createDirectory(parent, /*intermediates=*/true, {}, nullptr)) {
+        made = parent.subpath;
+      }
+    }
     (void)CopyOrMove(manager, from, to, copy, nullptr);  // an item that fails is skipped
   }
   // Kept: for a copy too, so that copying an empty directory into one of its name removes it.

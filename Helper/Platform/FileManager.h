@@ -5,6 +5,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <optional>
 #include <string>
 #include <utility>
@@ -93,6 +94,16 @@ class FileManager {
   /// permissions to set.
   virtual bool setAttributes(const FileAttributes& attributes, const FilePlace& place,
                              FileError* error) = 0;
+
+  /// setAttributes() for each item below the directory `path`, in the order given; `each` hears
+  /// after every one whether it succeeded. All share one error slot, which nothing clears.
+  virtual void setAttributesBelow(const std::string& path, const std::vector<std::string>& subpaths,
+                                  const FileAttributes& attributes, FileError* error,
+                                  const std::function<void(bool done)>& each) {
+    for (const std::string& subpath : subpaths) {
+      each(setAttributes(attributes, FilePlace(path, subpath), error));
+    }
+  }
 
   /// chown(2): gives an item to a user and a group, a link at the end followed.
   virtual bool changeOwner(const std::string& path, std::uint32_t uid, std::uint32_t gid) = 0;

@@ -247,4 +247,22 @@ TYPED_TEST(FileManagerContract, SetsPermissionsOfAnItemBelowADirectory) {
   EXPECT_EQ(error, ENOENT);
 }
 
+TYPED_TEST(FileManagerContract, SetsAttributesBelowADirectoryOneAfterTheOtherInOneSlot) {
+  this->files.folder("tree");
+  this->files.folder("tree/sub");
+  for (const char* name : {"tree/a", "tree/sub/b", "tree/c"}) this->files.file(name, "");
+  platform::FileAttributes attributes;
+  attributes.permissions = 0604;
+  std::vector<bool> heard;
+  FileError error;
+  this->manager().setAttributesBelow(this->files.at("tree"),
+                                     {"a", "none", "sub/b", "none/d", "sub/none", "c"}, attributes,
+                                     &error, [&](bool done) { heard.push_back(done); });
+  EXPECT_EQ(heard, (std::vector<bool>{true, false, true, false, false, true}));
+  EXPECT_EQ(error, ENOENT) << "a success does not clear the slot";
+  for (const char* name : {"tree/a", "tree/sub/b", "tree/c"}) {
+    EXPECT_EQ(this->files.permissions(name), 0604U) << name;
+  }
+}
+
 }  // namespace

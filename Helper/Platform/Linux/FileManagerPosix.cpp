@@ -61,14 +61,11 @@ int ApplyTo(int folder, const char* name, const Ids& ids,
       ::fchownat(folder, name, ids.owner, ids.group, AT_SYMLINK_NOFOLLOW) != 0) {
     return errno;
   }
-  if (!permissions) {
-    struct stat status {};
-    return ::fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW) == 0 ? 0 : errno;
-  }
+  if (!permissions && !ids.changeNothing()) return 0;
   const FileDescriptor item(::openat(folder, name, O_PATH | O_NOFOLLOW | O_CLOEXEC));
   struct stat status {};
   if (!item || ::fstat(item.get(), &status) != 0) return errno;
-  if (S_ISLNK(status.st_mode)) return 0;
+  if (!permissions || S_ISLNK(status.st_mode)) return 0;
   // The only way to change the mode of what must not be opened for reading.
   const std::string path = "/proc/self/fd/" + std::to_string(item.get());
   return ::chmod(path.c_str(), *permissions & 07777) == 0 ? 0 : errno;
@@ -209,6 +206,31 @@ class FileManagerPosix final : public FileManager {
     if (code == 0) code = ResolveIds(attributes, ids);
     if (code == 0) code = ApplyTo(at.folder.get(), at.name.c_str(), ids, attributes.permissions);
     return Answer(code, error);
+  }
+
+  void setAttributesBelow(const std::string& path, const std::vector<std::string>& subpaths,
+                          const FileAttributes& attributes, FileError* error,
+                          const std::function<void(bool done)>& each) override {
+    Ids ids;
+    const int resolving = path.empty() ? kNoErrorObject : ResolveIds(attributes, ids);
+    // Items of one folder stand together as a rule, so that one opening serves them all.
+    FileLocation at;
+    std::string folder;
+    bool isOpen = false;
+    for (const std::string& subpath : subpaths) {
+      const std::size_t slash = subpath.rfind('/');
+      const std::size_t length = slash == std::string::npos ? 0 : slash + 1;
+      int code = resolving;
+      if (code == 0 && (!isOpen || subpath.compare(0, length, folder) != 0)) {
+        code = Locate({path, subpath}, at);
+        isOpen = code == 0;
+        folder.assign(subpath, 0, length);
+      }
+      if (code == 0) {
+        code = ApplyTo(at.folder.get(), subpath.c_str() + length, ids, attributes.permissions);
+      }
+      each(Answer(code, error));
+    }
   }
 
   bool changeOwner(const std::string& path, std::uint32_t uid, std::uint32_t gid) override {
