@@ -20,7 +20,7 @@ endif()
 
 if(HALVEC_SANITIZE)
   target_compile_options(ProjectOptions INTERFACE -fsanitize=${HALVEC_SANITIZE}
-                         -fno-sanitize-recover=all -fno-omit-frame-pointer -g)
+                         -fno-sanitize-recover=all -fno-omit-frame-pointer -g1)
   target_link_options(ProjectOptions INTERFACE -fsanitize=${HALVEC_SANITIZE})
   if(HALVEC_SANITIZE MATCHES "thread")
     # asio's fences are on by default and the thread sanitizer does not model them.
