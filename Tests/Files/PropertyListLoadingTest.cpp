@@ -9,7 +9,7 @@
 #include <fstream>
 
 #include "Helper/Platform/PropertyList.h"
-#include "Helper/Platform/TaskMemory.h"
+#include "Tests/Fakes/FakeTaskMemory.h"
 #include "Tests/Support/ServerFixture.h"
 
 namespace {
@@ -24,23 +24,6 @@ using Lines = std::vector<fakes::FakeSystemLog::Line>;
 constexpr std::int32_t kId = 8683571;
 constexpr char kEmptyDictionary[] =
     "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n<dict/>\n</plist>\n";
-
-/// Memory that can be made to run out.
-class FailingMemory final : public platform::TaskMemory {
- public:
-  KernReturn allocate(platform::VmAddress& address, std::size_t size) override {
-    if (fails) return KERN_NO_SPACE;
-    ++regions;
-    return real.allocate(address, size);
-  }
-  void deallocate(platform::VmAddress address, std::size_t size) override {
-    --regions;
-    real.deallocate(address, size);
-  }
-  platform::TaskMemory& real = platform::DefaultProvider<platform::TaskMemory>();
-  bool fails = false;
-  int regions = 0;
-};
 
 class PropertyListLoading : public support::ServerFixture {
  protected:
@@ -71,7 +54,7 @@ class PropertyListLoading : public support::ServerFixture {
     EXPECT_EQ(log.takeLines(),
               (Lines{{LogPriority::kInfo, "Loading " + path + " as plist"},
                      {LogPriority::kError, "Could not create data representation of dictionary"}}));
-    EXPECT_EQ(memory.regions, 0);
+    EXPECT_EQ(memory.regions(), 0);
   }
   static Bytes withContent(const std::string& content) {
     Bytes reply(56 + content.size());
@@ -89,7 +72,7 @@ class PropertyListLoading : public support::ServerFixture {
     return reply;
   }
 
-  FailingMemory memory;
+  fakes::FakeTaskMemory memory;
   platform::ScopedReplacement<platform::TaskMemory> memoryReplacement{memory};
   std::string folder;
   std::unique_ptr<support::WireClient> client;
@@ -99,7 +82,7 @@ TEST_F(PropertyListLoading, AnswersAnEmptyDictionaryAsXml) {
   const std::string path = write("<plist version=\"1.0\"><dict></dict></plist>");
   EXPECT_EQ(load(path), withContent(kEmptyDictionary));
   EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kInfo, "Loading " + path + " as plist"}}));
-  EXPECT_EQ(memory.regions, 0) << "the region leaves with the reply";
+  EXPECT_EQ(memory.regions(), 0) << "the region leaves with the reply";
 }
 
 TEST_F(PropertyListLoading, AnswersABinaryFileAsXml) {
@@ -162,7 +145,7 @@ TEST_F(PropertyListLoading, OfMoreThan16MiBAnswers9) {
 
 TEST_F(PropertyListLoading, AnswersTheAllocationsCodeAndLogsTheCount) {
   const std::string path = write(kEmptyDictionary);
-  memory.fails = true;
+  memory.runOut();
   const Bytes reply = load(path);
   EXPECT_EQ(reply.size(), 36U);
   EXPECT_EQ(Get<std::int32_t>(reply, 32), KERN_NO_SPACE);
