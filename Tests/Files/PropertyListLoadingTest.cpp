@@ -18,7 +18,6 @@ using platform::LogPriority;
 using platform::PropertyList;
 using support::Bytes;
 using support::Get;
-using support::Put;
 using Lines = std::vector<fakes::FakeSystemLog::Line>;
 
 constexpr std::int32_t kId = 8683571;
@@ -57,19 +56,7 @@ class PropertyListLoading : public support::ServerFixture {
     EXPECT_EQ(memory.regions(), 0);
   }
   static Bytes withContent(const std::string& content) {
-    Bytes reply(56 + content.size());
-    Put(reply, 0, 0x80000000U);
-    Put(reply, 4, 56U);
-    Put(reply, 20, kId + 100);
-    Put(reply, 24, 1U);
-    reply[36] = 1;
-    reply[37] = 1;
-    reply[39] = 1;
-    Put(reply, 40, static_cast<std::uint32_t>(content.size()));
-    reply[48] = 1;
-    Put(reply, 52, static_cast<std::uint32_t>(content.size()));
-    support::PutText(reply, 56, content);
-    return reply;
+    return support::OutOfLineReply(kId, content);
   }
 
   fakes::FakeTaskMemory memory;

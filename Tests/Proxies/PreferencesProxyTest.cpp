@@ -11,7 +11,6 @@ using platform::LogPriority;
 using platform::PropertyList;
 using support::Bytes;
 using support::Get;
-using support::Put;
 using Lines = std::vector<fakes::FakeSystemLog::Line>;
 
 constexpr std::int32_t kCopy = 8683556;
@@ -37,21 +36,6 @@ class PreferencesProxy : public support::ServerFixture {
     support::PutText(bytes, 32, domain);
     support::PutText(bytes, 288, key);
     return request(*client, bytes).bytes;
-  }
-  static Bytes withContent(std::int32_t id, const std::string& content) {
-    Bytes reply(56 + content.size());
-    Put(reply, 0, 0x80000000U);
-    Put(reply, 4, 56U);
-    Put(reply, 20, id + 100);
-    Put(reply, 24, 1U);
-    reply[36] = 1;
-    reply[37] = 1;
-    reply[39] = 1;
-    Put(reply, 40, static_cast<std::uint32_t>(content.size()));
-    reply[48] = 1;
-    Put(reply, 52, static_cast<std::uint32_t>(content.size()));
-    support::PutText(reply, 56, content);
-    return reply;
   }
   std::optional<PropertyList> stored() { return store.copyValue("key", {.identifier = "domain"}); }
 
@@ -107,7 +91,7 @@ TEST_F(PreferencesProxy, ReadsATextWithoutItsZeroUpToItsLastByteButOne) {
 
 TEST_F(PreferencesProxy, CopyAnswersTheXmlFormAndLogsTheAllocation) {
   ASSERT_EQ(set(kXml), 0);
-  EXPECT_EQ(copy(kCopy), withContent(kCopy, kXml));
+  EXPECT_EQ(copy(kCopy), support::OutOfLineReply(kCopy, kXml));
   EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 93l (mhs1)\n"}}));
   EXPECT_EQ(memory.regions(), 0) << "the region leaves with the reply";
 }
@@ -115,8 +99,8 @@ TEST_F(PreferencesProxy, CopyAnswersTheXmlFormAndLogsTheAllocation) {
 TEST_F(PreferencesProxy, AppCopySearchesTheUsualScopesAndLogsItsOwnLine) {
   store.setValue("key", PropertyList("value"),
                  {.identifier = "domain", .user = platform::UserScope::kAnyUser});
-  EXPECT_EQ(copy(kCopy), withContent(kCopy, ""));
-  EXPECT_EQ(copy(kCopyApp), withContent(kCopyApp, kXml));
+  EXPECT_EQ(copy(kCopy), support::OutOfLineReply(kCopy, ""));
+  EXPECT_EQ(copy(kCopyApp), support::OutOfLineReply(kCopyApp, kXml));
   EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 93l (mhs2)\n"}}));
   EXPECT_EQ(memory.regions(), 0);
 }
@@ -145,8 +129,8 @@ TEST_F(PreferencesProxy, SetAnswersZeroAlsoWhenTheStoreCannotWrite) {
 }
 
 TEST_F(PreferencesProxy, CopyOfAMissingKeyAnswersZeroWithAnEmptyDescriptor) {
-  EXPECT_EQ(copy(kCopy), withContent(kCopy, ""));
-  EXPECT_EQ(copy(kCopyApp), withContent(kCopyApp, ""));
+  EXPECT_EQ(copy(kCopy), support::OutOfLineReply(kCopy, ""));
+  EXPECT_EQ(copy(kCopyApp), support::OutOfLineReply(kCopyApp, ""));
   EXPECT_TRUE(log.takeLines().empty());
 }
 

@@ -153,6 +153,23 @@ Bytes SetPreferenceRequest(const std::string& domain, const std::string& key,
   return bytes;
 }
 
+Bytes OutOfLineReply(std::int32_t id, const std::string& content) {
+  const auto size = static_cast<std::uint32_t>(content.size());
+  Bytes reply(56 + content.size());
+  Put(reply, 0, 0x80000000U);
+  Put(reply, 4, 56U);
+  Put(reply, 20, id + 100);
+  Put(reply, 24, 1U);
+  reply[36] = 1;
+  reply[37] = 1;
+  reply[39] = 1;
+  Put(reply, 40, size);
+  reply[48] = 1;
+  Put(reply, 52, size);
+  PutText(reply, 56, content);
+  return reply;
+}
+
 void WireClient::sendConnect(const Bytes& request, bool askForCredentials) {
   PortPair own = MakePort();
   PortPair reply = MakePort();

@@ -80,6 +80,9 @@ class LauncherSocket {
 [[nodiscard]] Bytes SetPreferenceRequest(const std::string& domain, const std::string& key,
                                          const std::string& value);
 
+/// The successful reply to request `id` that carries `content` behind it.
+[[nodiscard]] Bytes OutOfLineReply(std::int32_t id, const std::string& content);
+
 /// One client as it appears to the service: sends connects, keeps its own port and its private one.
 class WireClient {
  public:
