@@ -6,6 +6,20 @@ set(HALVEC_PORTS_DIRECTORY "/run/halvec/ports" CACHE STRING
     "Directory that holds the sockets of named message ports")
 set(HALVEC_ENTITLEMENT_DIRECTORIES "/etc/halvec/entitlements.d:/usr/share/halvec/entitlements.d"
     CACHE STRING "Directories of entitlement property lists, first match wins, separated by colons")
+set(HALVEC_MANIFEST_HOST "configuration.zarvo.example" CACHE STRING
+    "Host of the LASD version manifest, fetched by https")
+set(HALVEC_HEARTBEAT_TARGET "192.0.2.1" CACHE STRING
+    "IPv4 address that the data-path heartbeat sends its echo requests to")
+set(HALVEC_GEOCODER_ENDPOINT "" CACHE STRING
+    "Base URL of a Nominatim-compatible https service; empty: the offline atlas alone")
+set(HALVEC_ATLAS_FILE "/usr/share/halvec/atlas.bin" CACHE STRING
+    "The offline geocoder's data file")
+set(HALVEC_VOICEMAIL_LIBRARY "/usr/lib/halvec/libvisual-voicemail.so" CACHE STRING
+    "Path of the visual-voicemail library, opened at the first subscription query")
+set(HALVEC_VOICEMAIL_SYMBOL "VisualVoicemailIsSubscribed" CACHE STRING
+    "Its function without arguments that tells by an 8-bit boolean whether the service is subscribed")
+set(HALVEC_TOKEN_STORE "/var/lib/halvec-mobile-helper/voicemail-tokens.db" CACHE STRING
+    "File of the voicemail token store; its folder is made, readable by nobody else, when missing")
 
 option(HALVEC_BUILD_TESTS "Build the test programs" ON)
 option(HALVEC_BUILD_BENCHMARKS "Build the benchmark programs" ON)

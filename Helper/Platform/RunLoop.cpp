@@ -37,8 +37,8 @@ class MonotonicClock final : public Clock {
 }  // namespace
 
 Clock& SystemClock() {
-  static MonotonicClock clock;
-  return clock;
+  static auto* clock = new MonotonicClock;  // never destroyed: other threads may ask at exit
+  return *clock;
 }
 
 std::shared_ptr<RunLoopTimer> RunLoopTimer::Create(RunLoop& loop, TimePoint fireDate,

@@ -1,7 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// A clock that a test moves by hand. The test's thread only.
+// A clock that a test moves by hand. Any thread may ask it; one thread moves it.
 #pragma once
+
+#include <atomic>
 
 #include "Helper/Platform/Clock.h"
 
@@ -9,17 +11,19 @@ namespace fakes {
 
 class ManualClock final : public platform::Clock {
  public:
-  [[nodiscard]] platform::TimePoint now() const override { return now_; }
+  [[nodiscard]] platform::TimePoint now() const override {
+    return platform::TimePoint(now_.load());
+  }
   [[nodiscard]] bool passes() const override { return false; }
   [[nodiscard]] bool providesTimers() const override { return providesTimers_; }
 
   void advance(std::chrono::duration<double> step) {
-    now_ += std::chrono::duration_cast<platform::Duration>(step);
+    now_ = now_.load() + std::chrono::duration_cast<platform::Duration>(step);
   }
   void refuseTimers() { providesTimers_ = false; }
 
  private:
-  platform::TimePoint now_{std::chrono::hours(1)};
+  std::atomic<platform::Duration> now_{platform::Duration(std::chrono::hours(1))};
   bool providesTimers_ = true;
 };
 

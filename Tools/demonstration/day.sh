@@ -1,76 +1,20 @@
 #!/bin/sh
 # SPDX-License-Identifier: Apache-2.0
-# What ./run shows, from inside the simulated handset.
+# What ./run shows, from inside the simulated handset: the steps of day/ in the order of their names.
 set -eu
 tools=/usr/libexec/halvec
-file=/mnt/com.zarvo.carrier.plist
-domain=com.zarvo.carrier
+steps=/mnt/day
 
-say() { printf '\n\033[1m%s\033[0m\n' "$*"; }
+number=0
+# Opens a step: numbers it and says what it shows.
+say() {
+  number=$((number + 1))
+  printf '\n\033[1m%d. %s\033[0m\n' "$number" "$*"
+}
 # Shows a command as a person would type it, then runs it.
 show() {
   printf '$ %s\n' "$(echo "$*" | sed "s|$tools/||g")"
   "$@"
 }
-# Keys of the carrier file, and one value as a property list of its own.
-keys() {
-  python3 - "$file" <<'END'
-import plistlib, sys
-print("\n".join(plistlib.load(open(sys.argv[1], "rb"))))
-END
-}
-value_of() {
-  python3 - "$file" "$1" <<'END'
-import plistlib, sys
-sys.stdout.buffer.write(plistlib.dumps(plistlib.load(open(sys.argv[1], "rb"))[sys.argv[2]]))
-END
-}
 
-say "1. A handset of our own: nothing runs yet, the launcher holds the service port."
-show ls -l /run/halvec/ports
-show handset status
-
-say "2. halvecctl is let in, because root has listed it; so is every program that root lists."
-show handset entitle $tools/halvecctl root
-
-say "3. The first message starts the helper. Every value of a carrier file goes through it."
-for key in $(keys); do
-  value_of "$key" | $tools/halvecctl preference set $domain "$key" --plist -
-  echo "set $key"
-done
-show handset status
-
-say "4. Read back through the helper."
-for key in CarrierName AccessPoints SignalThreshold; do
-  show $tools/halvecctl preference get $domain $key
-done
-for key in $(keys); do
-  $tools/halvecctl preference get $domain "$key" --xml >/tmp/back.plist
-  value_of "$key" >/tmp/sent.plist
-  python3 - <<'END'
-import plistlib
-same = plistlib.load(open("/tmp/back.plist", "rb")) == plistlib.load(open("/tmp/sent.plist", "rb"))
-raise SystemExit(0 if same else "a value came back changed")
-END
-done
-echo "every value came back as it was sent"
-
-say "5. What is stored, and what the helper logged on the way."
-show ls -l /root/Library/Preferences
-python3 -c "
-import plistlib, pprint
-pprint.pprint(plistlib.load(open('/root/Library/Preferences/$domain.plist', 'rb')), sort_dicts=False)"
-handset log | tail -n 3
-
-say "6. The same program, run by a user whom nobody has listed, is refused with 35."
-printf '$ halvecctl preference get %s CarrierName     # as mobile\n' $domain
-code=0
-handset as mobile -- $tools/halvecctl preference get $domain CarrierName 2>&1 || code=$?
-[ $code -eq 4 ] || { echo "expected a refusal"; exit 1; }
-
-say "7. Everybody has disconnected. Ten idle seconds from now the helper leaves."
-show handset wait-exit --timeout 30
-show handset status
-
-echo
-echo "The next message would start it again. Nothing of this handset stays on this machine."
+for step in "$steps"/*.sh; do . "$step"; done
