@@ -1,0 +1,71 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// The sending side of named message ports, and the provider that uses those of this system.
+#include "Helper/Platform/Linux/MessagePortSocket.h"
+
+#include <fcntl.h>
+#include <sys/socket.h>
+#include <sys/un.h>
+
+#include <cerrno>
+#include <cstring>
+#include <vector>
+
+#include "Helper/Platform/FileDescriptor.h"
+#include "Helper/Shared/Interface/OneWayMessage.h"
+
+namespace platform {
+namespace {
+
+class RemoteSocket final : public RemoteMessagePort {
+ public:
+  explicit RemoteSocket(FileDescriptor socket) : socket_(std::move(socket)) {}
+
+  bool sendRequest(std::int32_t messageId, std::span<const std::byte> payload) override {
+    if (payload.size() > wire::kOneWayPayloadLimit) return false;
+    const std::vector<std::byte> datagram =
+        wire::EncodeOneWay({.id = messageId, .payload = payload});
+    ssize_t sent = -1;
+    do {
+      sent = ::send(socket_.get(), datagram.data(), datagram.size(), MSG_DONTWAIT | MSG_NOSIGNAL);
+    } while (sent < 0 && errno == EINTR);
+    return sent >= 0;
+  }
+
+ private:
+  const FileDescriptor socket_;
+};
+
+bool IsPortName(const std::string& name) {
+  return !name.empty() && name.front() != '.' && name.find('/') == std::string::npos &&
+         name.find('\0') == std::string::npos;
+}
+
+/// Connects to the socket file that `file` names, whatever stands at its path by now.
+bool ConnectToFile(int socket, int file) {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  const std::string path = "/proc/self/fd/" + std::to_string(file);
+  std::memcpy(static_cast<char*>(address.sun_path), path.c_str(), path.size() + 1);
+  return ::connect(socket, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
+}
+
+}  // namespace
+
+std::unique_ptr<RemoteMessagePort> MessagePortSockets::createRemote(const std::string& name) {
+  if (!IsPortName(name)) return nullptr;
+  const std::string path = directory_ + "/" + name;
+  const FileDescriptor file(::open(path.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC));
+  if (!file) return nullptr;
+  FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  if (!socket || !ConnectToFile(socket.get(), file.get())) return nullptr;
+  return std::make_unique<RemoteSocket>(std::move(socket));
+}
+
+template <>
+MessagePorts& DefaultProvider<MessagePorts>() {
+  static MessagePorts& ports = *new MessagePortSockets(HALVEC_PORTS_DIRECTORY);
+  return ports;
+}
+
+}  // namespace platform
