@@ -20,6 +20,8 @@ set(HALVEC_VOICEMAIL_SYMBOL "VisualVoicemailIsSubscribed" CACHE STRING
     "Its function without arguments that tells by an 8-bit boolean whether the service is subscribed")
 set(HALVEC_TOKEN_STORE "/var/lib/halvec-mobile-helper/voicemail-tokens.db" CACHE STRING
     "File of the voicemail token store; its folder is made, readable by nobody else, when missing")
+set(HALVEC_OBSERVER_SOCKET "" CACHE STRING
+    "Socket on which root watches the running helper (halvecctl status, monitor); empty: none")
 
 option(HALVEC_BUILD_TESTS "Build the test programs" ON)
 option(HALVEC_BUILD_BENCHMARKS "Build the benchmark programs" ON)

@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <array>
 
+#include "Helper/Platform/CurrentWork.h"
 #include "Helper/Platform/PortMessage.h"
 #include "Helper/Platform/ProcessExit.h"
 #include "Helper/Platform/RunLoopCore.h"
@@ -17,6 +18,25 @@ ReceiveBuffer& ThreadBuffer() {
   return buffer;
 }
 
+std::function<void(const ServedMessage&)>& ServedMessageHook() {
+  static thread_local std::function<void(const ServedMessage&)> hook;
+  return hook;
+}
+
+/// Says what this thread is busy with while it serves one message.
+class ScopedRequest {
+ public:
+  ScopedRequest(std::int32_t id, const wire::AuditToken& sender) {
+    CurrentWork& work = WorkOfThisThread();
+    work.requestId = id;
+    work.process = sender.words[wire::kAuditProcess];
+    work.user = sender.words[wire::kAuditUser];
+  }
+  ~ScopedRequest() { WorkOfThisThread().requestId = 0; }
+  ScopedRequest(const ScopedRequest&) = delete;
+  ScopedRequest& operator=(const ScopedRequest&) = delete;
+};
+
 /// The code of a finished reply; a complex reply carries none and means success.
 KernReturn CodeOfReply(const std::byte* reply) {
   const auto bits = wire::Load<std::uint32_t>(reply);
@@ -25,6 +45,10 @@ KernReturn CodeOfReply(const std::byte* reply) {
 }
 
 }  // namespace
+
+void SetServedMessageHook(std::function<void(const ServedMessage&)> hook) {
+  ServedMessageHook() = std::move(hook);
+}
 
 struct MigRunLoopSource::Watch : DescriptorWatch {
   Watch(RunLoop& runLoop, MigRunLoopSource& source)
@@ -87,16 +111,36 @@ void MigRunLoopSource::serveOne() {
     return;
   }
   if (status == ReceiveStatus::kNothing) return;
+  const bool refused = status == ReceiveStatus::kRefused;
+  const auto& hook = ServedMessageHook();
+  if (!hook) {
+    (void)answer(request, refused);
+  } else {
+    ServedMessage served{.port = port_,
+                         .id = request.header().id,
+                         .sender = refused ? wire::AuditToken{} : request.sender(),
+                         .code = KERN_SUCCESS,
+                         .took = {}};
+    const TimePoint start = SystemClock().now();
+    served.code = answer(request, refused);
+    served.took = SystemClock().now() - start;
+    hook(served);
+  }
+  loop.noteHandledSource();
+}
 
+/// Answers the message in the buffer and gives up what came with it. The code of the reply.
+KernReturn MigRunLoopSource::answer(ReceiveBuffer& request, bool refused) {
   alignas(std::max_align_t) std::array<std::byte, kMaxReplySize> reply;
   const wire::MessageHeader header = request.header();
   PrepareReply(header, reply.data(), subsystem_.maxReplySize);
-  if (status == ReceiveStatus::kRefused) {
+  if (refused) {
     wire::StoreReturnCode(reply.data(), request.refusal());
   } else {
     // A process that ended before this message came must be forgotten first: its process id may
     // be the sender's by now.
     if (named_) DeliverPendingProcessExits();
+    const ScopedRequest busy(header.id, request.sender());
     if (const MigStub stub = subsystem_.demultiplex(header)) stub(request.message(), reply.data());
   }
   const KernReturn code = CodeOfReply(reply.data());
@@ -110,7 +154,7 @@ void MigRunLoopSource::serveOne() {
     (void)SendMessage(destination, reply.data());
   }
   request.clear();
-  loop.noteHandledSource();
+  return code;
 }
 
 }  // namespace platform

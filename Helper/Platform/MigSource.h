@@ -6,9 +6,11 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <span>
 
+#include "Helper/Platform/Clock.h"
 #include "Helper/Platform/Port.h"
 #include "Helper/Platform/RunLoop.h"
 #include "Helper/Shared/Interface/Message.h"
@@ -36,9 +38,23 @@ struct MigSubsystem {
 /// The largest reply that a subsystem may announce.
 inline constexpr std::uint32_t kMaxReplySize = 512;
 
+/// One message that has been served, for whoever watches.
+struct ServedMessage {
+  PortName port;  // on which it came
+  std::int32_t id;
+  wire::AuditToken sender;  // all zero when the message was refused before its sender was known
+  KernReturn code;
+  Duration took;  // from its arrival to its reply
+};
+
+/// `hook` runs after each message that any source of the calling thread has served; null: none.
+void SetServedMessageHook(std::function<void(const ServedMessage&)> hook);
+
 /// Writes the reply that stands when a stub leaves it alone: 36 bytes, request id + 100, NDR
 /// record, MIG_BAD_ID; everything behind it up to `replySize` is zero.
 void PrepareReply(const wire::MessageHeader& request, std::byte* reply, std::uint32_t replySize);
+
+class ReceiveBuffer;
 
 class MigRunLoopSource : public std::enable_shared_from_this<MigRunLoopSource> {
  public:
@@ -64,6 +80,7 @@ class MigRunLoopSource : public std::enable_shared_from_this<MigRunLoopSource> {
   MigRunLoopSource(PortName port, SharedDescriptor socket, bool named,
                    const MigSubsystem& subsystem);
   void serveOne();
+  [[nodiscard]] KernReturn answer(ReceiveBuffer& request, bool refused);
 
   const PortName port_;
   const SharedDescriptor socket_;

@@ -46,6 +46,8 @@ class ReceiveBuffer {
     return wire::Load<wire::MessageHeader>(message_);
   }
   [[nodiscard]] KernReturn refusal() const { return refusal_; }
+  /// Who sent the message; all zero when that is not known.
+  [[nodiscard]] wire::AuditToken sender() const;
   /// The reply right that came with the message; empty when the answer goes back on the same port.
   [[nodiscard]] const FileDescriptor& replyRight() const { return replyRight_; }
 

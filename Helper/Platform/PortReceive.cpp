@@ -221,6 +221,11 @@ bool ReceiveBuffer::readMemory(std::byte* descriptor, std::size_t& inlineAt, std
   return true;
 }
 
+wire::AuditToken ReceiveBuffer::sender() const {
+  const auto trailer = wire::Load<wire::Trailer>(message_ + AlignedTrailerOffset(header().size));
+  return trailer.size == sizeof trailer ? trailer.auditToken : wire::AuditToken{};
+}
+
 void ReceiveBuffer::writeTrailer(const Control& control, bool named) {
   wire::Trailer trailer;
   trailer.size = wire::kAnonymousTrailerSize;

@@ -15,6 +15,8 @@
 #include <utility>
 #include <vector>
 
+#include "Helper/Platform/CurrentWork.h"
+
 namespace platform {
 
 struct TimerSource::State {
@@ -131,6 +133,7 @@ TimePoint WorkQueue::State::firstDue(Duration& leeway) const {
 
 void WorkQueue::State::run() {
   currentQueue = this;
+  WorkOfThisThread().queue = label.c_str();
   NameThread(label);
   std::unique_lock guard(mutex);
   for (;;) {

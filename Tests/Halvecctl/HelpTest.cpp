@@ -43,15 +43,16 @@ TEST(HalvecctlList, TakesGlobalOptionsBeforeTheCommandToo) {
 TEST(HalvecctlHelp, NamesEveryCommandAndExitCode) {
   const Outcome outcome = RunProgram({"--help"});
   EXPECT_EQ(outcome.exitCode, 0);
-  for (const char* text : {"list ", "preference ", "bundle ", "path ", "plist ", "file ",
-                           "crash-logs ", "call ", "--timeout", "  6  the preference"}) {
+  for (const char* text :
+       {"list ", "preference ", "bundle ", "path ", "plist ", "file ", "crash-logs ", "call ",
+        "status ", "monitor ", "--timeout", "  6  the preference"}) {
     EXPECT_NE(outcome.output.find(text), std::string::npos) << text;
   }
 }
 
 TEST(HalvecctlHelp, ExistsForEveryCommand) {
-  for (const char* command :
-       {"list", "preference", "bundle", "path", "plist", "file", "crash-logs", "call"}) {
+  for (const char* command : {"list", "preference", "bundle", "path", "plist", "file", "crash-logs",
+                              "call", "status", "monitor"}) {
     const Outcome outcome = RunProgram({command, "--help"});
     EXPECT_EQ(outcome.exitCode, 0);
     EXPECT_EQ(outcome.output.find("Usage: halvecctl " + std::string(command)), 0U);

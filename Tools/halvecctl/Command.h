@@ -30,6 +30,8 @@ extern const Command kPlistCommand;
 extern const Command kFileCommand;
 extern const Command kCrashLogsCommand;
 extern const Command kCallCommand;
+extern const Command kStatusCommand;
+extern const Command kMonitorCommand;
 
 /// Every command, in the order of --help.
 [[nodiscard]] std::span<const Command* const> Commands();

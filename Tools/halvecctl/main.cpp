@@ -87,9 +87,9 @@ void FlushOutput() {
 }  // namespace
 
 std::span<const Command* const> Commands() {
-  static constexpr std::array kCommands{&kListCommand,      &kPreferenceCommand, &kBundleCommand,
-                                        &kPathCommand,      &kPlistCommand,      &kFileCommand,
-                                        &kCrashLogsCommand, &kCallCommand};
+  static constexpr std::array kCommands{
+      &kListCommand, &kPreferenceCommand, &kBundleCommand, &kPathCommand,   &kPlistCommand,
+      &kFileCommand, &kCrashLogsCommand,  &kCallCommand,   &kStatusCommand, &kMonitorCommand};
   return kCommands;
 }
 

@@ -73,6 +73,9 @@ struct AuditToken {
   friend bool operator==(const AuditToken&, const AuditToken&) = default;
 };
 static_assert(sizeof(AuditToken) == 32);
+/// Words of the audit token: the user and the process that sent.
+inline constexpr std::size_t kAuditUser = 1;
+inline constexpr std::size_t kAuditProcess = 5;
 
 /// Stands behind a received message, written by the receiving side. Format 0.
 struct Trailer {

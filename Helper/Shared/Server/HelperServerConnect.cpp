@@ -45,6 +45,7 @@ KernReturn HelperServerConnectClient(PortName servicePort, PortName clientPort,
     const std::lock_guard guard(server->lock);
     (*server->clientPorts)[watcher] = port;
     (*server->portSources)[port] = source;
+    if (server->observation) server->observation->noteClient(port, auditToken);
   }
   // A source that the loop cannot watch serves nobody: the client is taken out again below, as if
   // its port had died.
@@ -94,6 +95,7 @@ void HelperServerRemoveClient(const std::shared_ptr<PortWatcher>& watcher, PortN
     server->portSources->erase(source);
   }
   if (privatePort == kPortNull || privatePort == kPortDead) return;
+  if (server->observation) server->observation->forgetClient(privatePort);
   PortToServerMapRemove(privatePort);
   platform::PortDropReceiveRight(privatePort);
   platform::PortDeallocate(privatePort);

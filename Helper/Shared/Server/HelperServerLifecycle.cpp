@@ -43,6 +43,9 @@ HelperServer* HelperServerCreate(const char* serviceName,
 
 int HelperServerRun(HelperServer* server) {
   server->runLoop = &RunLoop::Current();
+  // Where the socket cannot be made the service is the same; only nobody can watch it.
+  if (!server->observation)
+    server->observation = Observation::Open(*server, HALVEC_OBSERVER_SOCKET);
   int result = 0;
   // The flag is read without the lock: who sets it stops the loop afterwards.
   while (server->stopRequested == 0) {
@@ -86,6 +89,7 @@ std::uint32_t HelperServerAcquireWorkToken(HelperServer* server) {
   // Kept: with 32 bits set the shift wraps around and bit 0 is handed out a second time.
   const std::uint32_t token = 1U << (static_cast<unsigned>(std::countr_one(server->busyMask)) % 32);
   server->busyMask |= token;
+  if (server->observation) server->observation->noteWorkToken(token);
   HelperServerCancelIdleTimer(server);
   return token;
 }
@@ -94,6 +98,7 @@ bool HelperServerReleaseWorkToken(HelperServer* server, std::uint32_t token) {
   if (!std::has_single_bit(token)) return false;
   const std::lock_guard guard(server->lock);
   server->busyMask &= ~token;
+  if (server->observation) server->observation->forgetWorkToken(token);
   if (server->busyMask == 0 && server->clientPorts->empty()) HelperServerArmIdleTimer(server);
   return true;
 }

@@ -15,6 +15,7 @@
 #include "Helper/Platform/MigSource.h"
 #include "Helper/Platform/PortWatcher.h"
 #include "Helper/Platform/RunLoop.h"
+#include "Helper/Shared/Server/Observation.h"
 
 using ClientPorts = std::map<std::shared_ptr<platform::PortWatcher>, PortName>;
 using PortSources = std::unordered_map<PortName, std::shared_ptr<platform::MigRunLoopSource>>;
@@ -34,6 +35,7 @@ struct HelperServer {
   const platform::MigSubsystem* requestSubsystem = nullptr;
   std::uint32_t busyMask = 0;  // one bit per work token that is out
   std::atomic<std::uint8_t> stopRequested{0};
+  std::unique_ptr<Observation> observation;  // null where nobody may watch
 };
 
 /// Seconds from the last client's or the last token's end to the exit.
