@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // Check-in of a named service port: handed over by the launcher (sd_listen_fds(3) describes the
-// three variables) or bound by ourselves. Main thread, at start-up.
+// three variables) or bound by ourselves; then the launcher is told. Main thread, at start-up.
 #include <fcntl.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
@@ -14,6 +14,7 @@
 #include <cstring>
 #include <string_view>
 
+#include "Helper/Platform/Linux/LauncherNotice.h"
 #include "Helper/Platform/PortEntry.h"
 #include "Helper/Platform/ProcessIdentity.h"
 
@@ -151,6 +152,7 @@ KernReturn BootstrapCheckIn(const char* serviceName, PortName& name) {
     if (code != KERN_SUCCESS) return code;
   }
   name = PortInsertEntry(std::move(entry));
+  TellLauncherReady();
   return KERN_SUCCESS;
 }
 
