@@ -15,7 +15,9 @@
 #include "Tools/handset/Options.h"
 #include "Tools/handset/SignalName.h"
 #include "Tools/handset/SystemLogCapture.h"
+#include "Tools/handset/TelephonyMessage.h"
 #include "Tools/handset/UserDatabase.h"
+#include "Tools/handset/WireMessage.h"
 
 namespace handset {
 namespace {
@@ -179,6 +181,120 @@ TEST(SignalName, IsFoundInEveryForm) {
   EXPECT_EQ(SignalNumber("NOSUCH"), std::nullopt);
   EXPECT_EQ(SignalNumber("0"), std::nullopt);
   EXPECT_EQ(SignalNumber(""), std::nullopt);
+}
+
+std::string FromHex(std::string_view hex) {
+  std::string bytes;
+  for (std::size_t i = 0; i + 1 < hex.size(); i += 2) {
+    bytes += static_cast<char>(std::stoi(std::string(hex.substr(i, 2)), nullptr, 16));
+  }
+  return bytes;
+}
+
+TEST(WireMessage, IsHeaderLengthPayloadAndPadding) {
+  const std::string bytes = FromHex(
+      "00000000"
+      "20000000"
+      "00000000"
+      "00000000"
+      "00000000"
+      "07000000"
+      "03000000"
+      "61626300");
+  EXPECT_EQ(PayloadMessage(7, "abc"), bytes);
+  std::string reason;
+  const auto message = ParseWireMessage(bytes, reason);
+  ASSERT_TRUE(message) << reason;
+  EXPECT_EQ(message->id, 7U);
+  EXPECT_EQ(message->payload, "abc");
+  EXPECT_FALSE(message->carriesPort);
+  EXPECT_EQ(PayloadMessage(7, "").size(), 28U);
+  EXPECT_EQ(PayloadMessage(7, "abcd").size(), 32U);
+}
+
+TEST(WireMessage, MayCarryOnePort) {
+  const std::string bytes = FromHex(
+      "00000080"
+      "2c000000"
+      "00000000"
+      "00000000"
+      "00000000"
+      "07000000"
+      "01000000"
+      "00000000"
+      "00000000"
+      "00001100"
+      "00000000");
+  std::string reason;
+  const auto message = ParseWireMessage(bytes, reason);
+  ASSERT_TRUE(message) << reason;
+  EXPECT_TRUE(message->carriesPort);
+  EXPECT_EQ(message->payload, "");
+}
+
+TEST(WireMessage, IsRefusedWhereAnyByteIsWrong) {
+  const std::string good = FromHex(
+      "00000080"
+      "30000000"
+      "00000000"
+      "00000000"
+      "00000000"
+      "07000000"
+      "01000000"
+      "00000000"
+      "00000000"
+      "00001100"
+      "01000000"
+      "61000000");
+  std::string reason;
+  ASSERT_TRUE(ParseWireMessage(good, reason)) << reason;
+  for (std::size_t length = 0; length < good.size(); ++length) {
+    EXPECT_FALSE(ParseWireMessage(good.substr(0, length), reason)) << length;
+  }
+  for (std::size_t i = 0; i < good.size(); ++i) {
+    const bool isFree = (i >= 20 && i < 24) || i == 44;  // the id and the payload
+    std::string changed = good;
+    changed[i] = static_cast<char>(changed[i] ^ 0x40);
+    EXPECT_EQ(ParseWireMessage(changed, reason).has_value(), isFree) << "byte " << i;
+  }
+}
+
+TEST(TelephonyMessage, MustCarryExactlyTheRightThatItAnnounces) {
+  const std::string list = "bplist00" + FromHex(
+                                            "a0"  // an empty array, its offset, the trailer
+                                            "08"
+                                            "000000000000"
+                                            "0101"
+                                            "0000000000000001"
+                                            "0000000000000000"
+                                            "0000000000000009");
+  const std::string plain = PayloadMessage(kConnectMessage, list);
+  std::string carrying = plain;
+  carrying[3] = '\x80';
+  carrying.insert(24, FromHex("01000000"
+                              "00000000"
+                              "00000000"
+                              "00001100"));
+  carrying[4] = static_cast<char>(carrying.size());
+  const auto fault = [](const std::string& bytes, std::size_t rights) {
+    return DescribeTelephonyMessage(kConnectionPort, std::nullopt, bytes, rights).fault;
+  };
+  EXPECT_EQ(fault(carrying, 1), "");
+  EXPECT_EQ(fault(carrying, 0), "0 rights beside the message");
+  EXPECT_EQ(fault(carrying, 2), "2 rights beside the message");
+  EXPECT_EQ(fault(plain, 0), "no port descriptor");
+}
+
+TEST(TelephonyMessage, BelongsToOnePort) {
+  const auto fault = [](const char* port, std::optional<unsigned> connection, std::uint32_t id) {
+    return DescribeTelephonyMessage(port, connection, PayloadMessage(id, "xxxx"), 0).fault;
+  };
+  const std::string unknown = "unknown message id";
+  EXPECT_EQ(fault(kUpdatePort, std::nullopt, kLogToFileMessage), unknown);
+  EXPECT_EQ(fault(kRadioPort, std::nullopt, kUpdateMessage), unknown);
+  EXPECT_EQ(fault(kConnectionPort, std::nullopt, kCivicMessage), unknown);
+  EXPECT_EQ(fault(kConnectionPort, 1, kConnectMessage), "no port descriptor");
+  EXPECT_NE(fault(kConnectionPort, 1, kCivicMessage), unknown);
 }
 
 TEST(HandsetEventLoop, RunsDeadlinesInTimeAndNoCancelledOne) {

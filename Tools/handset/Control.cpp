@@ -4,33 +4,23 @@
 // else's. One thread, no lock.
 #include "Tools/handset/Control.h"
 
-#include <signal.h>
 #include <sys/epoll.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
-#include <cstdio>
-#include <memory>
-#include <optional>
+#include <chrono>
+#include <string_view>
 #include <utility>
 
 #include "Tools/handset/Failure.h"
 #include "Tools/handset/Files.h"
 #include "Tools/handset/Options.h"
-#include "Tools/handset/SignalName.h"
 #include "Tools/handset/UnixAddress.h"
 
 namespace handset {
 namespace {
-
-constexpr char kOutput = 'O';
-constexpr char kError = 'E';
-constexpr char kExit = 'X';
-constexpr std::size_t kLongestPacket = std::size_t{32} * 1024;
-constexpr int kNoLimit = -1;
 
 std::vector<std::string> SplitWords(std::string_view question) {
   std::vector<std::string> words;
@@ -40,40 +30,6 @@ std::vector<std::string> SplitWords(std::string_view question) {
     question.remove_prefix(end + 1);
   }
   return words;
-}
-
-std::string StatusJson(const LauncherStatus& status, std::size_t logLines) {
-  const auto boolean = [](bool value) { return std::string(value ? "true" : "false"); };
-  std::string json = "{\"running\":" + boolean(status.running.has_value());
-  json += ",\"pid\":" + (status.running ? std::to_string(*status.running) : "null");
-  json += ",\"starts\":" + std::to_string(status.starts);
-  json += ",\"exits\":" + std::to_string(status.exits);
-  json += ",\"stopped\":" + boolean(status.isStopped);
-  json += ",\"message_queued\":" + boolean(status.isMessageQueued);
-  json += ",\"log_lines\":" + std::to_string(logLines) + ",\"last_exit\":";
-  if (!status.last) return json + "null}\n";
-  return json + "{\"pid\":" + std::to_string(status.last->pid) +
-         ",\"code\":" + std::to_string(status.last->code) +
-         ",\"signal\":" + std::to_string(status.last->signal) +
-         ",\"lived_ms\":" + std::to_string(status.last->lived.count()) + "}}\n";
-}
-
-std::string StatusLines(const LauncherStatus& status, std::size_t logLines) {
-  std::string text = status.running ? "running as process " + std::to_string(*status.running)
-                                    : std::string("not running");
-  if (status.isStopped) text += ", stopped after a crash loop";
-  text += "\nstarts: " + std::to_string(status.starts) + "\n";
-  if (status.last) text += "last instance: " + Describe(*status.last) + "\n";
-  text += "log lines: " + std::to_string(logLines) + "\n";
-  return text;
-}
-
-enum class LogForm { kLines, kJson, kRaw };
-
-std::string Render(const LogEntry& entry, LogForm form) {
-  if (form == LogForm::kJson) return LogEntryJson(entry);
-  if (form == LogForm::kRaw) return entry.raw + '\n';
-  return LogEntryLine(entry);
 }
 
 }  // namespace
@@ -121,19 +77,15 @@ void Control::receive(ClientId id) {
   client.isAsked = true;
   question.resize(static_cast<std::size_t>(count));
   catchUp_();
-  try {
-    answer(id, SplitWords(question));
-  } catch (const Failure& failure) {
-    say(client, kError, std::string("handset: ") + failure.what() + "\n");
-    finish(client, failure.status());
-  }
+  answer(id, SplitWords(question));
   flush(id);
 }
 
 void Control::flush(ClientId id) {
   Client& client = clients_.at(id);
-  while (!client.packets.empty()) {
-    const std::string& packet = client.packets.front();
+  std::deque<std::string>& packets = client.question.packets();
+  while (!packets.empty()) {
+    const std::string& packet = packets.front();
     if (send(client.socket.get(), packet.data(), packet.size(), MSG_DONTWAIT | MSG_NOSIGNAL) < 0) {
       if (errno != EAGAIN) {
         drop(id);
@@ -142,8 +94,8 @@ void Control::flush(ClientId id) {
       loop_.change(client.watch, EPOLLIN | EPOLLOUT);
       return;
     }
-    const bool isLast = packet.front() == kExit;
-    client.packets.pop_front();
+    const bool isLast = packet.front() == kExitPacket;
+    packets.pop_front();
     if (isLast) {
       drop(id);
       return;
@@ -159,169 +111,39 @@ void Control::drop(ClientId id) {
   clients_.erase(id);
 }
 
-void Control::say(Client& client, char stream, std::string_view text) {
-  while (!text.empty()) {
-    const std::string_view part = text.substr(0, kLongestPacket - 1);
-    client.packets.push_back(stream + std::string(part));
-    text.remove_prefix(part.size());
-  }
-}
-
-void Control::finish(Client& client, int status) {
-  client.isAnswered = nullptr;
-  client.packets.push_back({kExit, static_cast<char>(status)});
-}
-
 void Control::lookAtWaits() {
-  std::vector<ClientId> answered;
+  std::vector<ClientId> clients;
   for (auto& [id, client] : clients_) {
-    // A copy: the answer ends the wait, and with it the function that is running.
-    const auto isAnswered = client.isAnswered;
-    if (isAnswered && isAnswered(client)) answered.push_back(id);
+    client.question.lookAgain();
+    if (!client.question.packets().empty()) clients.push_back(id);
   }
-  for (const ClientId id : answered) flush(id);
+  for (const ClientId id : clients) flush(id);
 }
 
-void Control::wait(ClientId id, int milliseconds, std::function<bool(Client&)> isAnswered) {
-  Client& client = clients_.at(id);
-  if (isAnswered(client)) return;
-  client.isAnswered = std::move(isAnswered);
-  if (milliseconds == kNoLimit) return;
-  const auto deadline = EventLoop::Clock::now() + std::chrono::milliseconds(milliseconds);
-  client.deadline = loop_.at(deadline, [this, id] {
-    Client& late = clients_.at(id);
-    say(late, kError, "handset: timed out\n");
-    finish(late, kStatusTimedOut);
-    flush(id);
-  });
+void Control::on(const std::string& verb, Answer answer) {
+  answers_.insert_or_assign(verb, std::move(answer));
 }
 
 void Control::answer(ClientId id, const Words& words) {
   Client& client = clients_.at(id);
+  Question& question = client.question;
   const std::string verb = words.empty() ? "" : words.front();
-  const Words rest(words.begin() + (words.empty() ? 0 : 1), words.end());
-  if (verb == "status") {
-    answerStatus(client, rest);
-  } else if (verb == "kill") {
-    answerKill(client, rest);
-  } else if (verb == "start-helper") {
-    answerStart(client);
-  } else if (verb == "wait-start") {
-    waitForStart(id, rest);
-  } else if (verb == "wait-exit") {
-    waitForExit(id, rest);
-  } else if (verb == "log") {
-    waitForLog(id, rest);
-  } else {
-    RefuseUsage("unknown command " + verb);
+  const auto found = answers_.find(verb);
+  try {
+    if (found == answers_.end()) RefuseUsage("unknown command " + verb);
+    found->second(question, Words(words.begin() + 1, words.end()));
+  } catch (const Failure& failure) {
+    question.complain(failure.what());
+    question.finish(failure.status());
   }
-}
-
-void Control::answerStatus(Client& client, const Words& words) const {
-  bool isJson = false;
-  OptionReader reader(words);
-  while (const auto option = reader.nextOption()) {
-    if (*option != "--json") RefuseUsage("unknown option " + *option);
-    isJson = true;
-  }
-  const std::size_t logLines = capture_.entries().size();
-  const LauncherStatus status = launcher_.status();
-  say(client, kOutput, isJson ? StatusJson(status, logLines) : StatusLines(status, logLines));
-  finish(client, 0);
-}
-
-void Control::answerKill(Client& client, const Words& words) const {
-  const std::optional<int> signal = words.empty() ? SIGTERM : SignalNumber(words.front());
-  if (!signal) RefuseUsage("unknown signal " + words.front());
-  if (!launcher_.signalHelper(*signal)) throw Failure("no helper runs", 1);
-  finish(client, 0);
-}
-
-void Control::answerStart(Client& client) const {
-  if (!launcher_.startNow()) throw Failure("a helper runs already", 1);
-  finish(client, 0);
-}
-
-void Control::waitForStart(ClientId id, const Words& words) {
-  int limit = kNoLimit;
-  std::optional<unsigned> starts;
-  OptionReader reader(words);
-  while (const auto option = reader.nextOption()) {
-    if (*option == "--timeout") {
-      limit = Milliseconds(reader.value());
-    } else if (*option == "--starts") {
-      starts = WholeNumber(reader.value());
-    } else {
-      RefuseUsage("unknown option " + *option);
-    }
-  }
-  wait(id, limit, [this, starts](Client& client) {
-    const LauncherStatus status = launcher_.status();
-    if (starts ? status.starts < *starts : !status.running) return false;
-    if (status.running) say(client, kOutput, std::to_string(*status.running) + "\n");
-    finish(client, 0);
-    return true;
-  });
-}
-
-void Control::waitForExit(ClientId id, const Words& words) {
-  int limit = kNoLimit;
-  const LauncherStatus now = launcher_.status();
-  // The instance that runs now, or else the last one, or else the first one to come.
-  unsigned exits = std::max(1U, now.exits + (now.running ? 1U : 0U));
-  OptionReader reader(words);
-  while (const auto option = reader.nextOption()) {
-    if (*option == "--timeout") {
-      limit = Milliseconds(reader.value());
-    } else if (*option == "--exits") {
-      exits = WholeNumber(reader.value());
-    } else {
-      RefuseUsage("unknown option " + *option);
-    }
-  }
-  wait(id, limit, [this, exits](Client& client) {
-    const LauncherStatus status = launcher_.status();
-    if (status.exits < exits) return false;
-    if (status.last) say(client, kOutput, Describe(*status.last) + "\n");
-    finish(client, 0);
-    return true;
-  });
-}
-
-void Control::waitForLog(ClientId id, const Words& words) {
-  int limit = kNoLimit;
-  LogForm form = LogForm::kLines;
-  // Shared, because the function that keeps it is copied while it runs.
-  const auto next = std::make_shared<std::size_t>(0);
-  std::optional<std::string> until;
-  OptionReader reader(words);
-  while (const auto option = reader.nextOption()) {
-    if (*option == "--timeout") {
-      limit = Milliseconds(reader.value());
-    } else if (*option == "--follow-until") {
-      until = reader.value();
-    } else if (*option == "--skip") {
-      *next = WholeNumber(reader.value());
-    } else if (*option == "--json") {
-      form = LogForm::kJson;
-    } else if (*option == "--raw") {
-      form = LogForm::kRaw;
-    } else {
-      RefuseUsage("unknown option " + *option);
-    }
-  }
-  wait(id, limit, [this, form, until, next](Client& client) {
-    const auto& entries = capture_.entries();
-    while (*next < entries.size()) {
-      const LogEntry& entry = entries[(*next)++];
-      say(client, kOutput, Render(entry, form));
-      if (until && entry.text.find(*until) != std::string::npos) {
-        finish(client, 0);
-        return true;
-      }
-    }
-    if (!until) finish(client, 0);
-    return !until;
+  if (question.isFinished() || !question.limit()) return;
+  const auto deadline = EventLoop::Clock::now() + std::chrono::milliseconds(*question.limit());
+  client.deadline = loop_.at(deadline, [this, id] {
+    Question& late = clients_.at(id).question;
+    if (late.isFinished()) return;
+    late.complain("timed out");
+    late.finish(kStatusTimedOut);
+    flush(id);
   });
 }
 
@@ -344,8 +166,8 @@ int AskHandset(const std::vector<std::string>& words) {
     if (count < 0 && errno == EINTR) continue;
     if (count <= 0) throw Failure("the handset went away");
     const std::string_view bytes(packet.data() + 1, static_cast<std::size_t>(count) - 1);
-    if (packet[0] == kExit && bytes.size() == 1) return static_cast<unsigned char>(bytes[0]);
-    if (!WriteAll(packet[0] == kError ? STDERR_FILENO : STDOUT_FILENO, bytes)) {
+    if (packet[0] == kExitPacket && bytes.size() == 1) return static_cast<unsigned char>(bytes[0]);
+    if (!WriteAll(packet[0] == kErrorPacket ? STDERR_FILENO : STDOUT_FILENO, bytes)) {
       throw Failure::FromErrno("write the answer");
     }
   }

@@ -7,7 +7,7 @@
 // here. One thread, no lock.
 #pragma once
 
-#include <deque>
+#include <cstdint>
 #include <functional>
 #include <map>
 #include <string>
@@ -15,8 +15,7 @@
 
 #include "Helper/Platform/FileDescriptor.h"
 #include "Tools/handset/EventLoop.h"
-#include "Tools/handset/Launcher.h"
-#include "Tools/handset/SystemLogCapture.h"
+#include "Tools/handset/Question.h"
 
 namespace handset {
 
@@ -24,16 +23,22 @@ inline constexpr const char* kControlSocket = "/run/handset/control";
 
 class Control {
  public:
-  /// `catchUp` brings launcher and capture up to everything that happened before the question was
-  /// sent.
-  Control(EventLoop& loop, Launcher& launcher, SystemLogCapture& capture,
-          std::function<void()> catchUp)
-      : loop_(loop), launcher_(launcher), capture_(capture), catchUp_(std::move(catchUp)) {}
+  using Words = std::vector<std::string>;
+  /// Answers a question, now or by Question::wait. `words` is what follows the verb. A Failure that
+  /// it throws becomes the answer.
+  using Answer = std::function<void(Question&, const Words& words)>;
+
+  /// `catchUp` brings the handset up to everything that happened before the question was sent.
+  Control(EventLoop& loop, std::function<void()> catchUp)
+      : loop_(loop), catchUp_(std::move(catchUp)) {}
+
+  /// Has `answer` answer the questions whose first word is `verb`.
+  void on(const std::string& verb, Answer answer);
 
   /// Creates the socket, for root only, and starts to answer; throws Failure.
   void open();
 
-  /// Answers the waits whose event has come. To be called after every change of launcher or log.
+  /// Answers the waits whose event has come. To be called after every change in the handset.
   void lookAtWaits();
 
  private:
@@ -42,11 +47,9 @@ class Control {
     platform::FileDescriptor socket;
     EventLoop::Ticket watch = 0;
     EventLoop::Ticket deadline = 0;
-    std::deque<std::string> packets;          ///< Not sent yet.
-    std::function<bool(Client&)> isAnswered;  ///< What it waits for; answers when it is there.
+    Question question;
     bool isAsked = false;
   };
-  using Words = std::vector<std::string>;
 
   void accept();
   void serve(ClientId id, std::uint32_t events);
@@ -54,21 +57,10 @@ class Control {
   void flush(ClientId id);
   void drop(ClientId id);
   void answer(ClientId id, const Words& words);
-  void answerStatus(Client& client, const Words& words) const;
-  void answerKill(Client& client, const Words& words) const;
-  void answerStart(Client& client) const;
-  void waitForStart(ClientId id, const Words& words);
-  void waitForExit(ClientId id, const Words& words);
-  void waitForLog(ClientId id, const Words& words);
-  void wait(ClientId id, int milliseconds, std::function<bool(Client&)> isAnswered);
-
-  static void say(Client& client, char stream, std::string_view text);
-  static void finish(Client& client, int status);
 
   EventLoop& loop_;
-  Launcher& launcher_;
-  SystemLogCapture& capture_;
   std::function<void()> catchUp_;
+  std::map<std::string, Answer> answers_;
   platform::FileDescriptor listener_;
   std::map<ClientId, Client> clients_;
   ClientId nextClient_ = 1;

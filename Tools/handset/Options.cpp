@@ -98,6 +98,8 @@ RunOptions ParseRunOptions(const std::vector<std::string>& arguments) {
       options.user = reader.value();
     } else if (*option == "--env-as") {
       options.environmentUser = reader.value();
+    } else if (*option == "--no-telephony") {
+      options.hasTelephony = false;
     } else if (*option == "--queue") {
       options.queue = WholeNumber(reader.value());
     } else if (*option == "--bind") {

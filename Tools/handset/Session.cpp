@@ -16,9 +16,11 @@
 #include <cstdint>
 
 #include "Tools/handset/Failure.h"
+#include "Tools/handset/HelperQuestions.h"
 #include "Tools/handset/Network.h"
 #include "Tools/handset/Process.h"
 #include "Tools/handset/Root.h"
+#include "Tools/handset/TelephonyQuestions.h"
 #include "Tools/handset/UserDatabase.h"
 
 namespace handset {
@@ -67,7 +69,8 @@ Session::Session(const RunOptions& options)
       eventsFile_(OpenAppending(options.eventsFile)),
       capture_(loop_, logFile_.get(), options.verbose),
       launcher_(loop_, kHelperInside, eventsFile_.get(), options.verbose),
-      control_(loop_, launcher_, capture_, [this] { catchUp(); }) {
+      telephony_(loop_),
+      control_(loop_, [this] { catchUp(); }) {
   umask(022);
   EnterRoot(options);
 }
@@ -113,6 +116,7 @@ void Session::catchUp() {
   capture_.drain();
   reap();
   launcher_.lookAtPort();
+  telephony_.drain();
 }
 
 void Session::startCommand() {
@@ -130,19 +134,27 @@ void Session::startCommand() {
   });
 }
 
+void Session::answerQuestions() {
+  AnswerAboutHelper(control_, launcher_, capture_);
+  AnswerAboutTelephony(control_, telephony_);
+  control_.open();
+}
+
 int Session::run() {
   Network network;
   network.bringUpLoopback();
   watchSignals();
   capture_.onEntry([this] { control_.lookAtWaits(); });
   launcher_.onChange([this] { control_.lookAtWaits(); });
+  telephony_.onMessage([this] { control_.lookAtWaits(); });
   // Each socket takes the length of its queue from the setting at its creation, and for good.
   const unsigned kernelsOwn = network.datagramQueue();
   network.setDatagramQueue(kLogQueue);
   capture_.open();
   network.setDatagramQueue(options_.queue.value_or(kernelsOwn));
   launcher_.open();
-  control_.open();
+  if (options_.hasTelephony) telephony_.start();
+  answerQuestions();
   startCommand();
   loop_.run();
   capture_.drain();

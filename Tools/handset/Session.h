@@ -14,6 +14,7 @@
 #include "Tools/handset/Launcher.h"
 #include "Tools/handset/Options.h"
 #include "Tools/handset/SystemLogCapture.h"
+#include "Tools/handset/Telephony.h"
 
 namespace handset {
 
@@ -37,6 +38,7 @@ class Session {
   void reap();
   void startCommand();
   void catchUp();
+  void answerQuestions();
 
   const RunOptions& options_;
   std::string workingDirectory_;
@@ -46,6 +48,7 @@ class Session {
   EventLoop loop_;
   SystemLogCapture capture_;
   Launcher launcher_;
+  Telephony telephony_;
   Control control_;
   pid_t command_ = 0;
   int status_ = 0;

@@ -35,6 +35,7 @@ ends with COMMAND's exit status. Needs root; leaves nothing behind.
   --state DIR         keep /var/mobile, /Library and /var/lib/halvec in DIR
   --bind SRC[:DST]    show SRC of the host, writable, at DST (default: as SRC)
   --install SRC[:NAME]  copy an executable to /usr/libexec/halvec/NAME
+  --no-telephony      leave the stand-in telephony daemon out
   --queue N           datagrams that a named port queues (default: the kernel's)
 
 Inside:
@@ -46,6 +47,9 @@ Inside:
   handset start-helper
   handset as [--without-group] USER [--] COMMAND [ARGUMENT]...
   handset install SRC [NAME]
+  handset telephony log [--json] [--skip N] [--count N] [--timeout SECONDS]
+  handset telephony start|stop|pause|resume|notify
+  handset telephony answer DOMAIN CODE
   handset entitle EXECUTABLE USER [--name NAME] [--value FRAGMENT]... [--unchecked]
 
 Exit statuses of its own: 2 usage, 124 timed out, 125 no handset, 126 and 127
