@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// The accounts of the system by name: where a user lives, and under which numbers. Any thread.
+// The accounts of the system: where a user lives, and under which numbers. Any thread.
 #pragma once
 
 #include <sys/types.h>
@@ -23,6 +23,8 @@ class UserDatabase {
   /// The POSIX path of the user's home directory, exactly as the database spells it; none when the
   /// user is unknown, has no home there, or its spelling is not UTF-8.
   [[nodiscard]] virtual std::optional<String> homeDirectory(const String& user) = 0;
+  /// The same for the user with this number.
+  [[nodiscard]] virtual std::optional<String> homeDirectory(uid_t user) = 0;
   /// The numbers of the account with this name; none when there is no such account.
   [[nodiscard]] virtual std::optional<UserIds> ids(const char* userName) = 0;
 };

@@ -27,6 +27,15 @@ class FakeUserDatabase final : public platform::UserDatabase {
     return platform::String::Decode(found->second, platform::StringEncoding::kUtf8);
   }
 
+  std::optional<platform::String> homeDirectory(uid_t user) override {
+    for (const auto& [name, ids] : ids_) {
+      if (ids.user == user)
+        return homeDirectory(
+            *platform::String::Decode(name.c_str(), platform::StringEncoding::kUtf8));
+    }
+    return std::nullopt;
+  }
+
   std::optional<platform::UserIds> ids(const char* userName) override {
     ++idQuestions_;
     const auto found = ids_.find(userName);

@@ -3,7 +3,6 @@
 
 #include <dirent.h>
 #include <fcntl.h>
-#include <pwd.h>
 #include <sys/stat.h>
 
 #include <algorithm>
@@ -12,9 +11,11 @@
 #include <cstdio>
 #include <span>
 #include <string_view>
+#include <utility>
 
 #include "Helper/Platform/Linux/TrustedPath.h"
 #include "Helper/Platform/ProcessIdentity.h"
+#include "Helper/Platform/UserDatabase.h"
 
 namespace platform {
 namespace {
@@ -56,16 +57,14 @@ std::optional<PropertyList> ReadPropertyList(int folder, const std::string& name
 
 std::optional<uid_t> UserOf(const PropertyList* value) {
   if (!value) return std::nullopt;
-  if (const auto number = value->integer()) return static_cast<uid_t>(*number);
+  if (const auto number = value->integer()) {
+    return std::in_range<uid_t>(*number) ? std::optional(static_cast<uid_t>(*number))
+                                         : std::nullopt;
+  }
   const std::string* name = value->string();
   if (!name) return std::nullopt;
-  passwd record{};
-  passwd* found = nullptr;
-  std::array<char, 4096> strings{};
-  if (::getpwnam_r(name->c_str(), &record, strings.data(), strings.size(), &found) != 0 || !found) {
-    return std::nullopt;
-  }
-  return found->pw_uid;
+  const auto ids = Shared<UserDatabase>().ids(name->c_str());
+  return ids ? std::optional(ids->user) : std::nullopt;
 }
 
 /// Whether `path` is, now and trusted, the very file that `running` is.

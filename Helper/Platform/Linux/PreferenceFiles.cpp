@@ -5,17 +5,16 @@
 #include "Helper/Platform/Linux/PreferenceFiles.h"
 
 #include <fcntl.h>
-#include <pwd.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <cstdio>
 #include <ctime>
 #include <memory>
 #include <vector>
 
 #include "Helper/Platform/Linux/PreferenceFileName.h"
 #include "Helper/Platform/SystemLog.h"
+#include "Helper/Platform/UserDatabase.h"
 
 namespace platform {
 
@@ -63,27 +62,9 @@ bool IsStored(const PropertyList::Dictionary& values, const Pending& pending) {
   });
 }
 
-struct FileCloser {
-  void operator()(std::FILE* file) const { static_cast<void>(std::fclose(file)); }  // only read
-};
-using File = std::unique_ptr<std::FILE, FileCloser>;
-
 std::string HomeOfEffectiveUser() {
-  constexpr std::size_t kEntryLength = 16'384;
-  const uid_t user = ::geteuid();
-  std::vector<char> buffer(kEntryLength);
-  passwd entry{};
-  passwd* found = nullptr;
-  // The file first: the database's other sources are modules that take long to load.
-  if (const File file{std::fopen("/etc/passwd", "re")}) {
-    while (::fgetpwent_r(file.get(), &entry, buffer.data(), buffer.size(), &found) == 0) {
-      if (found->pw_uid == user) return found->pw_dir;
-    }
-  }
-  if (::getpwuid_r(user, &entry, buffer.data(), buffer.size(), &found) == 0 && found != nullptr) {
-    return found->pw_dir;
-  }
-  return {};
+  const auto home = Shared<UserDatabase>().homeDirectory(::geteuid());
+  return home ? std::string(home->utf8()) : std::string();
 }
 
 std::string HostIdentifier() {
