@@ -33,7 +33,7 @@ struct Zlib {
 };
 
 const Zlib& Library() {
-  static const Zlib zlib;
+  static const Zlib& zlib = *new Zlib;
   return zlib;
 }
 

@@ -114,8 +114,6 @@ const char* asString(ErrorType error) {
       return "too many redirects";
     case ErrorType::kNoNetwork:
       return "no network that may be used";
-    case ErrorType::kNoMemory:
-      return "no memory";
     case ErrorType::kUnknown:
       break;
   }

@@ -36,12 +36,11 @@ enum class ErrorType : int {
   kCannotConnect = 4,      // no address took the connection
   kConnectionLost = 5,     // it broke before the response was whole
   kNotTrusted = 6,         // TLS failed, or the certificate is not the host's
-  kTooLarge = 7,           // body or header fields exceed what is kept
+  kTooLarge = 7,           // body or header fields exceed what is kept, or what memory holds
   kMalformedResponse = 8,  // not HTTP, or not decodable
   kRedirectRefused = 9,    // from https to http, to another scheme, or to nothing that is a URL
   kTooManyRedirects = 10,
   kNoNetwork = 11,  // none that the session may use
-  kNoMemory = 12,
 };
 
 /// A few words for the log. Never null.
