@@ -183,6 +183,8 @@ void WorkQueue::sync(const Work& work) {
 
 bool WorkQueue::isCurrent() const { return currentQueue == state_.get(); }
 
+TimePoint WorkQueue::now() const { return state_->clock.now(); }
+
 void WorkQueue::noteClockMoved() {
   const std::lock_guard guard(state_->mutex);
   state_->submitDueTicks();

@@ -38,6 +38,9 @@ class WorkQueue {
   /// Whether the calling code runs on this queue.
   [[nodiscard]] bool isCurrent() const;
 
+  /// The time by the queue's clock.
+  [[nodiscard]] TimePoint now() const;
+
   /// Submits the ticks that are due by now. For clocks that do not pass by themselves.
   void noteClockMoved();
 

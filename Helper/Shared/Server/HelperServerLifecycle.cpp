@@ -6,6 +6,7 @@
 #include <bit>
 #include <limits>
 #include <new>
+#include <unordered_set>
 
 #include "Helper/Platform/SystemLog.h"
 #include "Helper/Shared/Server/ConnectSubsystem.h"
@@ -16,11 +17,32 @@ using platform::Log;
 using platform::LogPriority;
 using platform::RunLoop;
 
+namespace {
+
+/// The records that exist. Work that outlives its request takes and returns tokens on queues of its
+/// own, and may do so while the main thread ends the process. `mutex` is held while a token is
+/// handled, hence before a record's own lock.
+struct LiveServers {
+  std::mutex mutex;
+  std::unordered_set<const HelperServer*> records;
+};
+
+LiveServers& Live() {
+  static LiveServers& live = *new LiveServers;  // also for threads that outlive static objects
+  return live;
+}
+
+}  // namespace
+
 HelperServer* HelperServerCreate(const char* serviceName,
                                  const platform::MigSubsystem* requestSubsystem) {
   PortToServerMapInitialize();
   auto* server = new (std::nothrow) HelperServer;
   if (!server) return nullptr;
+  {
+    const std::lock_guard guard(Live().mutex);
+    Live().records.insert(server);
+  }
   server->clientPorts = std::make_unique<ClientPorts>();
   server->portSources = std::make_unique<PortSources>();
 
@@ -55,6 +77,10 @@ int HelperServerRun(HelperServer* server) {
 }
 
 void HelperServerDestroy(HelperServer* server) {
+  {
+    const std::lock_guard guard(Live().mutex);
+    Live().records.erase(server);
+  }
   if (server->connectSource) {
     server->connectSource->invalidate();
     server->connectSource.reset();
@@ -85,6 +111,8 @@ void HelperServerDestroy(HelperServer* server) {
 }
 
 std::uint32_t HelperServerAcquireWorkToken(HelperServer* server) {
+  const std::lock_guard live(Live().mutex);
+  if (!Live().records.contains(server)) return 0;
   const std::lock_guard guard(server->lock);
   // Kept: with 32 bits set the shift wraps around and bit 0 is handed out a second time.
   const std::uint32_t token = 1U << (static_cast<unsigned>(std::countr_one(server->busyMask)) % 32);
@@ -96,6 +124,8 @@ std::uint32_t HelperServerAcquireWorkToken(HelperServer* server) {
 
 bool HelperServerReleaseWorkToken(HelperServer* server, std::uint32_t token) {
   if (!std::has_single_bit(token)) return false;
+  const std::lock_guard live(Live().mutex);
+  if (!Live().records.contains(server)) return false;
   const std::lock_guard guard(server->lock);
   server->busyMask &= ~token;
   if (server->observation) server->observation->forgetWorkToken(token);

@@ -57,11 +57,13 @@ void HelperServerDestroy(HelperServer* server);
 [[nodiscard]] HelperServer* HelperServerForPort(PortName port);
 
 /// Takes the lowest free work token, one bit of 32, and cancels the idle timer. Kept: with all 32
-/// out, the next caller is handed bit 0 again.
+/// out, the next caller is handed bit 0 again. 0, which is no token, when the server has been
+/// destroyed: work that outlives the main loop may still ask.
 [[nodiscard]] std::uint32_t HelperServerAcquireWorkToken(HelperServer* server);
 
 /// Gives a token back; arms the idle timer when it was the last one and no client is connected.
-/// False, with nothing changed, when `token` is not exactly one bit.
+/// False, with nothing changed, when `token` is not exactly one bit or the server has been
+/// destroyed.
 bool HelperServerReleaseWorkToken(HelperServer* server, std::uint32_t token);
 
 /// Both are called with `lock` held.
