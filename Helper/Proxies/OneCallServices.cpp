@@ -30,7 +30,7 @@ VoicemailSubscriptionFunction* LoadVoicemailSubscriptionFunction() {
   VoicemailSubscriptionFunction* function = nullptr;
   library.bind(function, HALVEC_VOICEMAIL_SYMBOL);
   if (!function) {
-    Log(LogPriority::kError, "No visual-voicemail subscription to ask for: %s",
+    Log(LogPriority::kNotice, "No visual-voicemail subscription to ask for: %s",
         library.failure().c_str());
   }
   return function;

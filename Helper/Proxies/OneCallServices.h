@@ -10,7 +10,7 @@
 using VoicemailSubscriptionFunction = std::uint8_t();
 
 /// Opens the visual-voicemail library of the build with lazy binding and finds its subscription
-/// function; null, with one error line in the log, when the library or the function is missing. The
+/// function; null, with one notice in the log, when the library or the function is missing. The
 /// library stays open for the life of the process.
 [[nodiscard]] VoicemailSubscriptionFunction* LoadVoicemailSubscriptionFunction();
 
