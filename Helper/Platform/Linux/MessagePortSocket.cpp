@@ -11,7 +11,6 @@
 #include <cstring>
 #include <vector>
 
-#include "Helper/Platform/FileDescriptor.h"
 #include "Helper/Shared/Interface/OneWayMessage.h"
 
 namespace platform {
@@ -52,13 +51,19 @@ bool ConnectToFile(int socket, int file) {
 
 }  // namespace
 
-std::unique_ptr<RemoteMessagePort> MessagePortSockets::createRemote(const std::string& name) {
-  if (!IsPortName(name)) return nullptr;
-  const std::string path = directory_ + "/" + name;
+FileDescriptor ConnectToNamedPort(const std::string& directory, const std::string& name) {
+  if (!IsPortName(name)) return {};
+  const std::string path = directory + "/" + name;
   const FileDescriptor file(::open(path.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC));
-  if (!file) return nullptr;
+  if (!file) return {};
   FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  if (!socket || !ConnectToFile(socket.get(), file.get())) return nullptr;
+  if (!socket || !ConnectToFile(socket.get(), file.get())) return {};
+  return socket;
+}
+
+std::unique_ptr<RemoteMessagePort> MessagePortSockets::createRemote(const std::string& name) {
+  FileDescriptor socket = ConnectToNamedPort(directory_, name);
+  if (!socket) return nullptr;
   return std::make_unique<RemoteSocket>(std::move(socket));
 }
 

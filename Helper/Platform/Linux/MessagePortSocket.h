@@ -8,17 +8,23 @@
 #include <string>
 #include <utility>
 
+#include "Helper/Platform/FileDescriptor.h"
 #include "Helper/Platform/MessagePort.h"
 
 namespace platform {
+
+/// A socket that sends to the port `name` in `directory`; empty when nobody has published it, or
+/// when `name` is no port name. The socket file itself is connected to: a symbolic link in its
+/// place is nobody's port, since whoever may publish a port could otherwise point the helper at any
+/// socket of the system.
+[[nodiscard]] FileDescriptor ConnectToNamedPort(const std::string& directory,
+                                                const std::string& name);
 
 class MessagePortSockets final : public MessagePorts {
  public:
   /// `directory` holds the sockets. Nothing is opened before the first handle.
   explicit MessagePortSockets(std::string directory) : directory_(std::move(directory)) {}
 
-  /// The socket file itself is connected to: a symbolic link in its place is nobody's port, since
-  /// whoever may publish a port could otherwise point the helper at any socket of the system.
   [[nodiscard]] std::unique_ptr<RemoteMessagePort> createRemote(const std::string& name) override;
 
  private:

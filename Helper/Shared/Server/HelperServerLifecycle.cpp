@@ -8,6 +8,7 @@
 #include <new>
 #include <unordered_set>
 
+#include "Helper/Platform/MainQueue.h"
 #include "Helper/Platform/SystemLog.h"
 #include "Helper/Shared/Server/ConnectSubsystem.h"
 #include "Helper/Shared/Server/HelperServerUtils.h"
@@ -65,6 +66,7 @@ HelperServer* HelperServerCreate(const char* serviceName,
 
 int HelperServerRun(HelperServer* server) {
   server->runLoop = &RunLoop::Current();
+  const platform::ScopedMainQueue mainQueue(*server->runLoop);
   // Where the socket cannot be made the service is the same; only nobody can watch it.
   if (!server->observation)
     server->observation = Observation::Open(*server, HALVEC_OBSERVER_SOCKET);

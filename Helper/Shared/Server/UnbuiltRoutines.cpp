@@ -23,10 +23,6 @@ KernReturn server_HvMobileHelperCopyVoicemailToken(PortName, wire::Text<256>&) {
 KernReturn server_HvMobileHelperTriggerDatabaseUpdate(PortName, std::uint32_t) {
   return KERN_FAILURE;
 }
-KernReturn server_HvMobileHelperRequestCountryCodeFromLocation(PortName, double, double) {
-  return KERN_FAILURE;
-}
-KernReturn server_HvMobileHelperCopyCountryCode(PortName, wire::Text<64>&) { return KERN_FAILURE; }
 KernReturn server_HvMobileHelperExtractArchive(PortName, wire::Text<256>&, wire::Text<256>&,
                                                wire::Flag&) {
   return KERN_FAILURE;
