@@ -1,0 +1,112 @@
+#!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
+"""Runs what the documents show.
+
+A fenced block marked `console` is a transcript: a line that begins with "$ " is a command, what
+follows is its output. In a manual page the same stands after ".Dl $ ". All transcripts of a document
+run in order in one simulated handset, in one shell, with halvecctl entitled for root. Each command
+must end with 0, or with what a comment "# exits N" behind it says, and print every line that the
+document shows, numbers apart: a number stands for any number, and "..." for anything.
+"""
+import argparse
+import pathlib
+import re
+import subprocess
+import sys
+
+FENCE = re.compile(r"^```console\n(.*?)^```$", re.MULTILINE | re.DOTALL)
+MANUAL = re.compile(r"^\.Dl (\$ .*)$", re.MULTILINE)
+EXITS = re.compile(r"\s+# exits (\d+)$")
+MARK = "=== end of command "
+
+
+class Step:
+    def __init__(self, command):
+        expected = EXITS.search(command)
+        self.status = int(expected.group(1)) if expected else 0
+        self.command = EXITS.sub("", command)
+        self.output = []
+
+
+def steps_of(name, text):
+    """The commands of one document, each with the lines that it is said to print."""
+    if not name.endswith(".md"):
+        return [Step(line[2:]) for line in MANUAL.findall(text)]
+    steps = []
+    for block in FENCE.findall(text):
+        for line in block.splitlines():
+            if line.startswith("$ "):
+                steps.append(Step(line[2:]))
+            elif line.startswith("> ") and not steps[-1].output:
+                steps[-1].command += "\n" + line[2:]
+            elif line.strip():
+                steps[-1].output.append(line)
+    return steps
+
+
+def pattern_of(line):
+    parts = re.split(r"(\d[\d.]*|\.\.\.)", line.strip())
+    return "".join(".*" if part == "..." else r"\d[\d.]*" if part[:1].isdigit() else
+                   re.escape(part) for part in parts)
+
+
+def failures(step, status, output):
+    """What of one command is not as the document says."""
+    if status != step.status:
+        yield f"exits with {status} instead of {step.status}"
+    lines = [line.strip() for line in output]
+    for shown in step.output:
+        if not any(re.fullmatch(pattern_of(shown), line) for line in lines):
+            yield f"does not print: {shown}"
+
+
+def script_of(steps):
+    lines = ["handset entitle /usr/libexec/halvec/halvecctl root >/dev/null", "exec 2>&1"]
+    for step in steps:
+        lines += [step.command, f'status=$?; echo; echo "{MARK}$status"']
+    return "\n".join(lines)
+
+
+def run(handset, steps):
+    """The (status, lines of output) of each command."""
+    done = subprocess.run(handset + ["--", "sh", "-c", script_of(steps)], text=True, timeout=300,
+                          stdout=subprocess.PIPE, stderr=subprocess.STDOUT, check=False)
+    results, output = [], []
+    for line in done.stdout.splitlines():
+        if line.startswith(MARK):
+            results.append((int(line[len(MARK):]), output))
+            output = []
+        else:
+            output.append(line)
+    return results + [(-1, output)] * (len(steps) - len(results))
+
+
+def self_test():
+    step = steps_of("a.md", "```console\n$ false  # exits 1\nit took 12.5 s ...\n```\n")[0]
+    assert (step.command, step.status) == ("false", 1)
+    assert not list(failures(step, 1, ["it took 7 s or so"]))
+    assert list(failures(step, 0, ["it took 7 s or so"]))
+    assert list(failures(step, 1, ["it took long"]))
+    assert steps_of("a.1", ".Dl $ halvecctl list\n")[0].command == "halvecctl list"
+
+
+def main():
+    self_test()
+    parser = argparse.ArgumentParser()
+    parser.add_argument("--document", required=True)
+    parser.add_argument("handset", nargs="+", help="handset run and its options")
+    options = parser.parse_args()
+    text = pathlib.Path(options.document).read_text(encoding="utf-8")
+    steps = steps_of(options.document, text)
+    bad = 0
+    for step, (status, output) in zip(steps, run(options.handset, steps)):
+        for failure in failures(step, status, output):
+            bad += 1
+            print(f"{step.command}\n  {failure}\n  it printed:")
+            print("".join(f"    {line}\n" for line in output))
+    print(f"{len(steps)} commands, {bad} not as shown")
+    return 1 if bad or not steps else 0
+
+
+if __name__ == "__main__":
+    sys.exit(main())
