@@ -1,0 +1,27 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// What a manifest, and the preferences after an install, hold per type: a dictionary with the texts
+// "Version" and "ContentURL"; what else it holds is kept. Pure; any thread.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+#include "Helper/Platform/PropertyList.h"
+
+inline constexpr std::string_view kVersionKey = "Version";
+inline constexpr std::string_view kContentURLKey = "ContentURL";
+
+/// The value of `key` when it is a dictionary, else null.
+[[nodiscard]] inline const platform::PropertyList* DictionaryAt(const platform::PropertyList& list,
+                                                                std::string_view key) {
+  const platform::PropertyList* value = list.find(key);
+  return value && value->dictionary() ? value : nullptr;
+}
+
+/// The value of `key` when it is a string, else null.
+[[nodiscard]] inline const std::string* TextAt(const platform::PropertyList& list,
+                                               std::string_view key) {
+  const platform::PropertyList* value = list.find(key);
+  return value ? value->string() : nullptr;
+}
