@@ -32,6 +32,8 @@ class PublishedPort {
   PublishedPort(const PublishedPort&) = delete;
   PublishedPort& operator=(const PublishedPort&) = delete;
 
+  [[nodiscard]] int get() const { return socket_.get(); }
+
   /// Stops listening and leaves the file, as a process does that was killed.
   void abandon() { socket_.reset(); }
 
