@@ -12,6 +12,10 @@ set(HALVEC_HEARTBEAT_TARGET "192.0.2.1" CACHE STRING
     "IPv4 address that the data-path heartbeat sends its echo requests to")
 set(HALVEC_GEOCODER_ENDPOINT "" CACHE STRING
     "Base URL of a Nominatim-compatible https service; empty: the offline atlas alone")
+if(HALVEC_GEOCODER_ENDPOINT AND NOT HALVEC_GEOCODER_ENDPOINT MATCHES "^https://[^/]+.*[^/]$")
+  message(FATAL_ERROR "HALVEC_GEOCODER_ENDPOINT must be an https URL without a slash at its end: "
+                      "where the handset is concerns nobody on the way")
+endif()
 set(HALVEC_ATLAS_FILE "/usr/share/halvec/atlas.bin" CACHE STRING
     "The offline geocoder's data file")
 set(HALVEC_VOICEMAIL_LIBRARY "/usr/lib/halvec/libvisual-voicemail.so" CACHE STRING
