@@ -90,7 +90,7 @@ void LASDUpdater::updateDatabase(LASDDatabaseType type) {
     Log(LogPriority::kNotice, "Could not find %s database URL", typeName(type));
     return;
   }
-  const std::string* url = entry->second ? TextAt(*entry->second, kContentURLKey) : nullptr;
+  const std::string* url = entry->second ? TextAt(*entry->second, kLASDContentURLKey) : nullptr;
   if (!url || url->empty()) {
     Log(LogPriority::kNotice, "URL for %s database is empty\n", typeName(type));
     return;
@@ -146,7 +146,7 @@ bool LASDUpdater::record(LASDDatabaseType type) const {
   auto& store = platform::Shared<platform::PreferencesStore>();
   store.setValue(name, version, domain);
   if (!store.synchronize(domain)) return false;
-  const std::string* text = version ? TextAt(*version, kVersionKey) : nullptr;
+  const std::string* text = version ? TextAt(*version, kLASDVersionKey) : nullptr;
   Log(LogPriority::kNotice, "Downloaded %s database version %s successfully\n", name,
       text ? text->c_str() : "");
   return true;

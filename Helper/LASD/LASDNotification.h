@@ -7,8 +7,8 @@
 
 #include <cstdint>
 
-#include "Helper/LASD/LASDDatabaseType.h"
 #include "Helper/Platform/PropertyList.h"
+#include "Helper/Shared/Interface/LASD.h"
 
 enum class LASDNotificationKind : std::uint32_t {
   kUpdateAvailable = 0,   // a database was installed and recorded

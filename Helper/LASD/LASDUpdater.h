@@ -12,15 +12,11 @@
 #include <optional>
 #include <string>
 
-#include "Helper/LASD/LASDDatabaseType.h"
 #include "Helper/Platform/PropertyList.h"
 #include "Helper/Platform/vlu/SharedSynchronizable.h"
+#include "Helper/Shared/Interface/LASD.h"
 #include "Helper/Shared/Server/HelperServerUtils.h"
 
-/// Where the database files are.
-inline constexpr char kLASDDirectory[] = "/var/mobile/Library/LASD";
-/// The preference domain of the recorded versions.
-inline constexpr char kLASDDomain[] = "com.zarvo.lasd";
 /// https, the host that the build names, "/1/v3/lasd.plist".
 extern const char* const kLASDManifestURL;
 

@@ -67,9 +67,9 @@ bool LASDUpdater::isUpToDate(const PropertyList* manifest, LASDDatabaseType type
     Log(LogPriority::kNotice, "%s db is not present locally, update required\n", name);
     return false;
   }
-  const std::string* serverVersion = TextAt(*server, kVersionKey);
+  const std::string* serverVersion = TextAt(*server, kLASDVersionKey);
   const std::optional<PropertyList>& local = versionTable_[type];
-  const std::string* localVersion = local ? TextAt(*local, kVersionKey) : nullptr;
+  const std::string* localVersion = local ? TextAt(*local, kLASDVersionKey) : nullptr;
   const char* serverText = serverVersion ? serverVersion->c_str() : "";
   if (serverVersion && localVersion &&
       platform::EqualIgnoringCaseWithNumbers(*serverVersion, *localVersion)) {

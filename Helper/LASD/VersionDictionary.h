@@ -1,16 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// What a manifest, and the preferences after an install, hold per type: a dictionary with the texts
-// "Version" and "ContentURL"; what else it holds is kept. Pure; any thread.
+// Reading manifests, and what the preferences hold of them. Pure; any thread.
 #pragma once
 
 #include <string>
 #include <string_view>
 
 #include "Helper/Platform/PropertyList.h"
-
-inline constexpr std::string_view kVersionKey = "Version";
-inline constexpr std::string_view kContentURLKey = "ContentURL";
 
 /// The value of `key` when it is a dictionary, else null.
 [[nodiscard]] inline const platform::PropertyList* DictionaryAt(const platform::PropertyList& list,

@@ -44,15 +44,15 @@ TEST(HalvecctlHelp, NamesEveryCommandAndExitCode) {
   const Outcome outcome = RunProgram({"--help"});
   EXPECT_EQ(outcome.exitCode, 0);
   for (const char* text :
-       {"list ", "preference ", "bundle ", "path ", "plist ", "file ", "crash-logs ", "call ",
-        "status ", "monitor ", "--timeout", "  6  the preference"}) {
+       {"list ", "preference ", "bundle ", "path ", "plist ", "file ", "crash-logs ", "lasd ",
+        "call ", "status ", "monitor ", "--timeout", "  6  the preference"}) {
     EXPECT_NE(outcome.output.find(text), std::string::npos) << text;
   }
 }
 
 TEST(HalvecctlHelp, ExistsForEveryCommand) {
   for (const char* command : {"list", "preference", "bundle", "path", "plist", "file", "crash-logs",
-                              "call", "status", "monitor"}) {
+                              "lasd", "call", "status", "monitor"}) {
     const Outcome outcome = RunProgram({command, "--help"});
     EXPECT_EQ(outcome.exitCode, 0);
     EXPECT_EQ(outcome.output.find("Usage: halvecctl " + std::string(command)), 0U);
@@ -115,6 +115,15 @@ TEST(HalvecctlUsage, ErrorsAreOneSentenceAndExitWithTwo) {
       {{"crash-logs"}, "expected copy"},
       {{"crash-logs", "move"}, "unknown action 'move'"},
       {{"crash-logs", "copy"}, "expected SOURCE, got 0 arguments"},
+      {{"lasd"}, "expected update or status"},
+      {{"lasd", "downgrade"}, "unknown action 'downgrade'"},
+      {{"lasd", "status", "gsm"}, "expected no arguments, got 1 argument"},
+      {{"lasd", "update", "gsm"}, "expected no arguments, got 1 argument"},
+      {{"lasd", "update", "--types", "gsm,5g"}, "'5g' is none of gsm, umts, cdma, lte and scdma"},
+      {{"lasd", "update", "--types", ""}, "'' is none of"},
+      {{"lasd", "update", "--types", "gsm,"}, "'' is none of"},
+      {{"lasd", "update", "--within", "5"}, "--within is for --wait"},
+      {{"lasd", "update", "--wait", "--within", "-1"}, "'-1' is not a number of seconds"},
       {{"preference"}, "expected set, get or remove"},
       {{"preference", "list"}, "unknown action 'list'"},
       {{"preference", "set", "d", "k"}, "expected DOMAIN KEY VALUE, got 2 arguments"},

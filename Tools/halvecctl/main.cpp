@@ -87,9 +87,10 @@ void FlushOutput() {
 }  // namespace
 
 std::span<const Command* const> Commands() {
-  static constexpr std::array kCommands{
-      &kListCommand, &kPreferenceCommand, &kBundleCommand, &kPathCommand,   &kPlistCommand,
-      &kFileCommand, &kCrashLogsCommand,  &kCallCommand,   &kStatusCommand, &kMonitorCommand};
+  static constexpr std::array kCommands{&kListCommand,      &kPreferenceCommand, &kBundleCommand,
+                                        &kPathCommand,      &kPlistCommand,      &kFileCommand,
+                                        &kCrashLogsCommand, &kLasdCommand,       &kCallCommand,
+                                        &kStatusCommand,    &kMonitorCommand};
   return kCommands;
 }
 

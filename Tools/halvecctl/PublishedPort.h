@@ -1,0 +1,34 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// A named message port of this program's own, for the helper's one-way messages. One thread.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <string>
+#include <vector>
+
+#include "Helper/Platform/FileDescriptor.h"
+
+namespace halvecctl {
+
+class PublishedPort {
+ public:
+  /// Publishes the port `name` beside the service socket at `servicePath`. Throws Failure when
+  /// another program holds the name, or the socket cannot be made.
+  PublishedPort(const std::string& servicePath, const std::string& name);
+  ~PublishedPort();
+  PublishedPort(const PublishedPort&) = delete;
+  PublishedPort& operator=(const PublishedPort&) = delete;
+
+  /// The next datagram; waits for it. Throws Failure when none has come by `deadline`, or when
+  /// `helper`, a descriptor that shows when the helper goes away, hangs up.
+  [[nodiscard]] std::vector<std::byte> receive(int helper,
+                                               std::chrono::steady_clock::time_point deadline);
+
+ private:
+  const std::string path_;
+  platform::FileDescriptor socket_;
+};
+
+}  // namespace halvecctl
