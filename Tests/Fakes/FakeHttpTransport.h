@@ -4,9 +4,11 @@
 // held while an answer is made.
 #pragma once
 
+#include <algorithm>
 #include <functional>
 #include <map>
 #include <mutex>
+#include <regex>
 #include <string>
 #include <utility>
 #include <vector>
@@ -52,7 +54,11 @@ class FakeHttpTransport final : public vlu::Http::HttpTransport {
   }
 
   bool accepts(const std::string& url) override {
-    return url.starts_with("http://") || url.starts_with("https://");
+    static const std::regex kUrl(R"(https?://(\[[0-9a-f:]+\]|[^\[\]/?#@:]+)(:[0-9]+)?([/?#].*)?)",
+                                 std::regex::icase);
+    const bool printable =
+        std::all_of(url.begin(), url.end(), [](char c) { return c > ' ' && c <= '~'; });
+    return printable && std::regex_match(url, kUrl);
   }
 
   std::shared_ptr<vlu::Http::HttpResponse> retrieve(const vlu::Http::Transfer& transfer) override {

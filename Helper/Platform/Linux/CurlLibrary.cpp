@@ -52,6 +52,9 @@ const CurlLibrary* CurlLibrary::shared() {
 
 bool ParseHttpUrl(const CurlLibrary& curl, const std::string& url, HttpTarget& target) {
   if (!std::all_of(url.begin(), url.end(), IsPrintable)) return false;
+  // The library mends a wrong number of slashes, which makes a host of what was none.
+  const std::size_t authority = url.find("://");
+  if (authority == std::string::npos || url.compare(authority + 3, 1, "/") == 0) return false;
   const std::unique_ptr<CURLU, decltype(curl.urlCleanup)> parsed(curl.url(), curl.urlCleanup);
   if (!parsed ||
       curl.urlSet(parsed.get(), CURLUPART_URL, url.c_str(), CURLU_DISALLOW_USER) != CURLUE_OK) {
