@@ -13,6 +13,7 @@
 #include "Tools/handset/Json.h"
 #include "Tools/handset/Mounts.h"
 #include "Tools/handset/Options.h"
+#include "Tools/handset/Packet.h"
 #include "Tools/handset/SignalName.h"
 #include "Tools/handset/SystemLogCapture.h"
 #include "Tools/handset/TelephonyMessage.h"
@@ -183,16 +184,8 @@ TEST(SignalName, IsFoundInEveryForm) {
   EXPECT_EQ(SignalNumber(""), std::nullopt);
 }
 
-std::string FromHex(std::string_view hex) {
-  std::string bytes;
-  for (std::size_t i = 0; i + 1 < hex.size(); i += 2) {
-    bytes += static_cast<char>(std::stoi(std::string(hex.substr(i, 2)), nullptr, 16));
-  }
-  return bytes;
-}
-
 TEST(WireMessage, IsHeaderLengthPayloadAndPadding) {
-  const std::string bytes = FromHex(
+  const std::string bytes = BytesOfHex(
       "00000000"
       "20000000"
       "00000000"
@@ -213,7 +206,7 @@ TEST(WireMessage, IsHeaderLengthPayloadAndPadding) {
 }
 
 TEST(WireMessage, MayCarryOnePort) {
-  const std::string bytes = FromHex(
+  const std::string bytes = BytesOfHex(
       "00000080"
       "2c000000"
       "00000000"
@@ -233,7 +226,7 @@ TEST(WireMessage, MayCarryOnePort) {
 }
 
 TEST(WireMessage, IsRefusedWhereAnyByteIsWrong) {
-  const std::string good = FromHex(
+  const std::string good = BytesOfHex(
       "00000080"
       "30000000"
       "00000000"
@@ -259,8 +252,40 @@ TEST(WireMessage, IsRefusedWhereAnyByteIsWrong) {
   }
 }
 
+Packet PacketOfHex(const std::string& hex) { return {7, "wlan0", true, BytesOfHex(hex)}; }
+
+TEST(Packet, IsShownWithAddressesAndPorts) {
+  const Packet udp = PacketOfHex(
+      "450000200000000040110000"
+      "0a000002"
+      "c0000201"
+      "0035ffff000c0000");
+  EXPECT_EQ(PacketLine(udp),
+            "wlan0 out udp 10.0.0.2:53 > 192.0.2.1:65535 "
+            "4500002000000000401100000a000002c00002010035ffff000c0000\n");
+  const Packet other = PacketOfHex(
+      "4500001400000000402f0000"
+      "0a000002"
+      "c0000201");
+  EXPECT_EQ(PacketJson(other),
+            "{\"monotonic_ns\":7,\"interface\":\"wlan0\",\"direction\":\"out\",\"protocol\":\"47\","
+            "\"source\":\"10.0.0.2\",\"destination\":\"192.0.2.1\","
+            "\"hex\":\"4500001400000000402f00000a000002c0000201\"}\n");
+}
+
+TEST(Packet, MayBeCutShortOrNoIpAtAll) {
+  EXPECT_EQ(PacketLine(PacketOfHex("45")), "wlan0 out ? ? > ? 45\n");
+  EXPECT_EQ(ProtocolOf(PacketOfHex(std::string(40, '6'))), "?");
+  const Packet noPorts = PacketOfHex(
+      "4f00001400000000"
+      "40060000"
+      "0a000002"
+      "c0000201");
+  EXPECT_EQ(PacketLine(noPorts).substr(0, 39), "wlan0 out tcp 10.0.0.2 > 192.0.2.1 4f00");
+}
+
 TEST(TelephonyMessage, MustCarryExactlyTheRightThatItAnnounces) {
-  const std::string list = "bplist00" + FromHex(
+  const std::string list = "bplist00" + BytesOfHex(
                                             "a0"  // an empty array, its offset, the trailer
                                             "08"
                                             "000000000000"
@@ -271,10 +296,10 @@ TEST(TelephonyMessage, MustCarryExactlyTheRightThatItAnnounces) {
   const std::string plain = PayloadMessage(kConnectMessage, list);
   std::string carrying = plain;
   carrying[3] = '\x80';
-  carrying.insert(24, FromHex("01000000"
-                              "00000000"
-                              "00000000"
-                              "00001100"));
+  carrying.insert(24, BytesOfHex("01000000"
+                                 "00000000"
+                                 "00000000"
+                                 "00001100"));
   carrying[4] = static_cast<char>(carrying.size());
   const auto fault = [](const std::string& bytes, std::size_t rights) {
     return DescribeTelephonyMessage(kConnectionPort, std::nullopt, bytes, rights).fault;

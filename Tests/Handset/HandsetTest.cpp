@@ -230,10 +230,5 @@ TEST_F(Handset, RefusesToEntitleWhatTheSystemWouldNotTrust) {
             "relative.plist\n");
 }
 
-TEST_F(Handset, HasOnlyItsLoopbackInterfaceAndThatIsUp) {
-  const Outcome run = RunHandset("ls /sys/class/net; cat /sys/class/net/lo/flags; hostname");
-  EXPECT_EQ(run.output, "lo\n0x9\nhandset\n");
-}
-
 }  // namespace
 }  // namespace handset_tests

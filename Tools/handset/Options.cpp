@@ -98,6 +98,8 @@ RunOptions ParseRunOptions(const std::vector<std::string>& arguments) {
       options.user = reader.value();
     } else if (*option == "--env-as") {
       options.environmentUser = reader.value();
+    } else if (*option == "--no-network") {
+      options.hasNetwork = false;
     } else if (*option == "--no-telephony") {
       options.hasTelephony = false;
     } else if (*option == "--queue") {

@@ -19,6 +19,7 @@ struct RunOptions {
   std::string user = "root";      ///< Whom the command runs as.
   std::string environmentUser;    ///< Whose clean environment it gets; empty: the caller's.
   std::optional<unsigned> queue;  ///< Datagrams that a named port queues; none: kernel's own.
+  bool hasNetwork = true;         ///< The links to the world are there from the start.
   bool hasTelephony = true;       ///< The stand-in telephony daemon runs from the start.
   std::vector<std::pair<std::string, std::string>> binds;     ///< Host path, path inside.
   std::vector<std::pair<std::string, std::string>> installs;  ///< Host path, name inside.

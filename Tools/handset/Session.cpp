@@ -117,6 +117,7 @@ void Session::catchUp() {
   reap();
   launcher_.lookAtPort();
   telephony_.drain();
+  if (surroundings_) surroundings_->drain();
 }
 
 void Session::startCommand() {
@@ -137,12 +138,16 @@ void Session::startCommand() {
 void Session::answerQuestions() {
   AnswerAboutHelper(control_, launcher_, capture_);
   AnswerAboutTelephony(control_, telephony_);
+  if (surroundings_) surroundings_->answerQuestions(control_);
   control_.open();
 }
 
 int Session::run() {
   Network network;
   network.bringUpLoopback();
+  if (options_.hasNetwork) {
+    surroundings_ = std::make_unique<Surroundings>(loop_, [this] { control_.lookAtWaits(); });
+  }
   watchSignals();
   capture_.onEntry([this] { control_.lookAtWaits(); });
   launcher_.onChange([this] { control_.lookAtWaits(); });

@@ -6,6 +6,7 @@
 
 #include <sys/types.h>
 
+#include <memory>
 #include <string>
 
 #include "Helper/Platform/FileDescriptor.h"
@@ -13,6 +14,7 @@
 #include "Tools/handset/EventLoop.h"
 #include "Tools/handset/Launcher.h"
 #include "Tools/handset/Options.h"
+#include "Tools/handset/Surroundings.h"
 #include "Tools/handset/SystemLogCapture.h"
 #include "Tools/handset/Telephony.h"
 
@@ -46,6 +48,7 @@ class Session {
   platform::FileDescriptor eventsFile_;
   platform::FileDescriptor signals_;
   EventLoop loop_;
+  std::unique_ptr<Surroundings> surroundings_;  ///< None without a network.
   SystemLogCapture capture_;
   Launcher launcher_;
   Telephony telephony_;

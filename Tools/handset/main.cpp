@@ -16,6 +16,7 @@
 #include "Tools/handset/Process.h"
 #include "Tools/handset/Session.h"
 #include "Tools/handset/UserDatabase.h"
+#include "Tools/handset/World.h"
 
 namespace handset {
 namespace {
@@ -35,6 +36,7 @@ ends with COMMAND's exit status. Needs root; leaves nothing behind.
   --state DIR         keep /var/mobile, /Library and /var/lib/halvec in DIR
   --bind SRC[:DST]    show SRC of the host, writable, at DST (default: as SRC)
   --install SRC[:NAME]  copy an executable to /usr/libexec/halvec/NAME
+  --no-network        leave the links to the world out
   --no-telephony      leave the stand-in telephony daemon out
   --queue N           datagrams that a named port queues (default: the kernel's)
 
@@ -50,6 +52,14 @@ Inside:
   handset telephony log [--json] [--skip N] [--count N] [--timeout SECONDS]
   handset telephony start|stop|pause|resume|notify
   handset telephony answer DOMAIN CODE
+  handset network counters [--json] [INTERFACE]
+  handset network down|up|remove|add INTERFACE
+  handset capture start INTERFACE
+  handset capture show [--protocol NAME] [--skip N] [--count N] [--timeout SECONDS]
+      [--json] [INTERFACE]
+  handset tower reply on|off
+  handset tower send HEX
+  handset world [--] COMMAND [ARGUMENT]...
   handset entitle EXECUTABLE USER [--name NAME] [--value FRAGMENT]... [--unchecked]
 
 Exit statuses of its own: 2 usage, 124 timed out, 125 no handset, 126 and 127
@@ -88,6 +98,15 @@ int Check() {
   BecomeProgram(command, environment);
 }
 
+[[noreturn]] void InWorld(const std::vector<std::string>& arguments) {
+  OptionReader reader(arguments);
+  while (const auto option = reader.nextOption()) RefuseUsage("unknown option " + *option);
+  const std::vector<std::string> command = reader.rest();
+  if (command.empty()) RefuseUsage("world needs a command");
+  EnterWorld();
+  BecomeProgram(command, InheritedEnvironment());
+}
+
 int Main(const std::vector<std::string>& words) {
   if (words.empty()) RefuseUsage("a command is needed");
   const std::string& verb = words.front();
@@ -99,6 +118,7 @@ int Main(const std::vector<std::string>& words) {
   if (verb == "run") return Run(rest);
   if (verb == "check") return Check();
   if (verb == "as") As(rest);
+  if (verb == "world") InWorld(rest);
   if (verb == "install") {
     Install(rest);
     return 0;
