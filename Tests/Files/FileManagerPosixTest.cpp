@@ -15,32 +15,16 @@
 
 #include "Helper/Platform/FileManager.h"
 #include "Tests/Files/FolderForTest.h"
+#include "Tests/Files/SmallFileSystem.h"
 #include "Tests/Support/WireClient.h"
 
 namespace {
 
+using files_test::SmallFileSystem;
 using platform::FileAttributes;
 using platform::FileError;
 using platform::FileKind;
 using platform::FilePlace;
-
-/// A small file system of its own, which only root can mount.
-class SmallFileSystem {
- public:
-  explicit SmallFileSystem(const std::string& path) : path_(path) {
-    mounted_ = ::mount("tmpfs", path.c_str(), "tmpfs", 0, "size=256k") == 0;
-  }
-  ~SmallFileSystem() {
-    if (mounted_) ::umount2(path_.c_str(), MNT_DETACH);
-  }
-  SmallFileSystem(const SmallFileSystem&) = delete;
-  SmallFileSystem& operator=(const SmallFileSystem&) = delete;
-  explicit operator bool() const { return mounted_; }
-
- private:
-  std::string path_;
-  bool mounted_ = false;
-};
 
 class FileManagerPosix : public ::testing::Test {
  protected:

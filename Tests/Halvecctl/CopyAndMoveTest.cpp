@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// halvecctl file, crash-logs and bundle move: the literal requests they make, and what a success
-// flag comes to.
+// halvecctl file, crash-logs, bundle move and bundle extract: the literal requests they make, and
+// what a success flag comes to.
 #include <gtest/gtest.h>
 
 #include <string>
@@ -60,6 +60,24 @@ TEST(BundleMove, SendsTheSourceTheDirectoryAndTheName) {
   EXPECT_EQ(exchange.outcome.exitCode, 0) << exchange.outcome.errors;
   EXPECT_EQ(exchange.request, Head("20030000", "2e808400") + Slot(256, "/from") + Slot(256, "/to") +
                                   Slot(256, "x.bundle"));
+}
+
+TEST(BundleExtract, SendsTheArchiveAndTheDestination) {
+  const Exchange exchange =
+      RunAnswered({"bundle", "extract", "/a.tcbk", "/to"}, FlagReply("96808400", true));
+  EXPECT_EQ(exchange.outcome.exitCode, 0) << exchange.outcome.errors;
+  EXPECT_EQ(exchange.outcome.output, "");
+  EXPECT_EQ(exchange.request,
+            Head("20020000", "32808400") + Slot(256, "/a.tcbk") + Slot(256, "/to"));
+}
+
+TEST(BundleExtract, FailsWhereTheFlagIsFalse) {
+  const Exchange exchange =
+      RunAnswered({"bundle", "extract", "/a.tcbk", "/to", "--json"}, FlagReply("96808400", false));
+  EXPECT_EQ(exchange.outcome.exitCode, 1);
+  EXPECT_EQ(exchange.outcome.output, "{\"success\":false}\n");
+  EXPECT_EQ(exchange.outcome.errors,
+            "halvecctl: the helper could not do it; the system log says why\n");
 }
 
 }  // namespace

@@ -53,12 +53,20 @@ ExitCode RunMove(const GlobalOptions& options, Words words) {
                         options);
 }
 
+ExitCode RunExtract(const GlobalOptions& options, Words words) {
+  const std::vector<std::string> texts = words.takeAll(2, "ARCHIVE DESTINATION");
+  halvec::HelperClient client = Connect(options);
+  return FinishWithFlag(client.call<requests::ExtractArchive>(texts[0], texts[1]), options);
+}
+
 ExitCode RunBundle(const GlobalOptions& options, Words words) {
   const std::optional<std::string> action = words.takeFirst();
-  if (!action) throw UsageFailure("expected link, unlink or move; see halvecctl bundle --help");
+  if (!action)
+    throw UsageFailure("expected link, unlink, move or extract; see halvecctl bundle --help");
   if (*action == "link") return RunLink(options, std::move(words));
   if (*action == "unlink") return RunUnlink(options, std::move(words));
   if (*action == "move") return RunMove(options, std::move(words));
+  if (*action == "extract") return RunExtract(options, std::move(words));
   throw UsageFailure("unknown action '" + *action + "'; see halvecctl bundle --help");
 }
 
@@ -67,8 +75,8 @@ ExitCode RunBundle(const GlobalOptions& options, Words words) {
 constinit const Command kBundleCommand{
     "bundle",
     "link TARGET LINK-PATH [OPTION...] | unlink PATH [--domain DOMAIN] | "
-    "move SOURCE DESTINATION-DIRECTORY NAME",
-    "point a carrier-bundle link at a target, remove it, or move a bundle",
+    "move SOURCE DESTINATION-DIRECTORY NAME | extract ARCHIVE DESTINATION",
+    "point a carrier-bundle link at a target, remove it, move or unpack a bundle",
     "link     replaces what stands at LINK-PATH by a symbolic link to TARGET. LINK-PATH must be "
     "on\n"
     "         the helper's list; halvecctl path explain tells.\n"
@@ -81,6 +89,8 @@ constinit const Command kBundleCommand{
     "         gives all of it to the helper's own user. The directory is made where it is "
     "missing,\n"
     "         also when the place is then refused.\n"
+    "extract  unpacks the zip file ARCHIVE into the folder DESTINATION, which is made where it is\n"
+    "         missing. An item that cannot be extracted is left out, which is no failure.\n"
     "A path of a link that is not allowed is answered with code 8.\n",
     RunBundle};
 

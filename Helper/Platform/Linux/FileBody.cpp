@@ -16,18 +16,6 @@ namespace {
 
 constexpr std::size_t kBlock = 256 * 1024;
 
-int WriteAll(int to, const std::byte* bytes, std::size_t count, off_t offset) {
-  while (count > 0) {
-    const ssize_t written = ::pwrite(to, bytes, count, offset);
-    if (written < 0 && errno == EINTR) continue;
-    if (written < 0) return errno;
-    bytes += written;
-    count -= static_cast<std::size_t>(written);
-    offset += written;
-  }
-  return 0;
-}
-
 /// Through a buffer, up to `end` or the end of the file.
 int CopyByReading(int from, int to, off_t offset, off_t end) {
   std::vector<std::byte> buffer(kBlock);
@@ -106,6 +94,23 @@ int CopyExtendedAttributes(int from, int to) {
 }
 
 }  // namespace
+
+bool EndsEveryWrite(int error) {
+  return error == ENOSPC || error == EDQUOT || error == EROFS || error == EMFILE ||
+         error == ENFILE || error == ENOMEM;
+}
+
+int WriteAll(int to, const std::byte* bytes, std::size_t count, off_t offset) {
+  while (count > 0) {
+    const ssize_t written = ::pwrite(to, bytes, count, offset);
+    if (written < 0 && errno == EINTR) continue;
+    if (written < 0) return errno;
+    bytes += written;
+    count -= static_cast<std::size_t>(written);
+    offset += written;
+  }
+  return 0;
+}
 
 int CopyFileBytes(int from, int to, const struct stat& status) {
   // Files of the kernel's own making say that they are empty.

@@ -5,7 +5,16 @@
 
 #include <sys/stat.h>
 
+#include <cstddef>
+
 namespace platform {
+
+/// Whether an error number says that nothing more can be written here, so that the rest of a tree
+/// or an archive need not be tried.
+[[nodiscard]] bool EndsEveryWrite(int error);
+
+/// Writes all of the bytes at `offset`. An error number, or 0.
+[[nodiscard]] int WriteAll(int to, const std::byte* bytes, std::size_t count, off_t offset);
 
 /// Copies what `from` holds into the new, empty file `to`. Holes stay holes. An error number, or 0.
 [[nodiscard]] int CopyFileBytes(int from, int to, const struct stat& status);

@@ -8,6 +8,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdint>
 #include <cstdio>
 #include <string_view>
 #include <utility>
@@ -17,16 +18,15 @@ namespace {
 
 constexpr int kPathOnly = O_PATH | O_DIRECTORY | O_CLOEXEC;
 
-/// Opens a directory below `root` that no link leads to or away from.
-FileDescriptor OpenBeneath(int root, const std::string& subpath) {
+}  // namespace
+
+FileDescriptor OpenBeneath(int root, const std::string& subpath, int flags) {
   open_how how{};
-  how.flags = kPathOnly;
-  how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS;
+  how.flags = static_cast<std::uint64_t>(flags | O_CLOEXEC);
+  how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS | RESOLVE_NO_MAGICLINKS;
   return FileDescriptor(
       static_cast<int>(::syscall(SYS_openat2, root, subpath.c_str(), &how, sizeof how)));
 }
-
-}  // namespace
 
 int Locate(const FilePlace& place, FileLocation& location) {
   if (place.path.empty()) return kNoErrorObject;
@@ -48,7 +48,7 @@ int Locate(const FilePlace& place, FileLocation& location) {
     location = {std::move(root), place.subpath};
     return 0;
   }
-  location = {OpenBeneath(root.get(), place.subpath.substr(0, slash)),
+  location = {OpenBeneath(root.get(), place.subpath.substr(0, slash), kPathOnly),
               place.subpath.substr(slash + 1)};
   return location.folder ? 0 : errno;
 }

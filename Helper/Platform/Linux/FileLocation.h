@@ -31,6 +31,10 @@ struct FileLocation {
 /// Finds the folder of a place. 0, kNoErrorObject for the empty path, or why it cannot be opened.
 [[nodiscard]] int Locate(const FilePlace& place, FileLocation& location);
 
+/// Opens what stands at `subpath` below the folder `root` if no link leads to it or away from it;
+/// it may not be a link itself either (ELOOP).
+[[nodiscard]] FileDescriptor OpenBeneath(int root, const std::string& subpath, int flags);
+
 /// Renames within or between folders, to a name that must be free (EEXIST). An error number or 0.
 [[nodiscard]] int RenameToFreeName(int fromFolder, const char* from, int toFolder, const char* to);
 

@@ -8,16 +8,22 @@
 #include <algorithm>
 #include <cerrno>
 
-#include "Helper/Platform/FileDescriptor.h"
+#include "Helper/Platform/Linux/OpenRegularFile.h"
 #include "Helper/Platform/RegularFile.h"
 
 namespace platform {
 
-std::optional<std::vector<std::byte>> ReadRegularFile(const char* path, std::size_t limit) {
+int OpenRegularFile(const char* path, FileDescriptor& file, struct stat& status) {
   // Non-blocking, because opening a FIFO for reading would wait for its writer.
-  const FileDescriptor file(::open(path, O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+  file.reset(::open(path, O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+  if (!file || ::fstat(file.get(), &status) != 0) return errno;
+  return S_ISREG(status.st_mode) ? 0 : EOPNOTSUPP;
+}
+
+std::optional<std::vector<std::byte>> ReadRegularFile(const char* path, std::size_t limit) {
+  FileDescriptor file;
   struct stat status {};
-  if (!file || ::fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode)) return std::nullopt;
+  if (OpenRegularFile(path, file, status) != 0) return std::nullopt;
   const auto expected = static_cast<std::size_t>(std::max<off_t>(status.st_size, 0));
   if (expected > limit) return std::nullopt;
   // One byte more than expected, so that the end is seen without another resize.

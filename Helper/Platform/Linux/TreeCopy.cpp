@@ -18,12 +18,6 @@
 namespace platform {
 namespace {
 
-/// After these nothing more can be written, so the rest is not tried.
-bool EndsTheCopy(int error) {
-  return error == ENOSPC || error == EDQUOT || error == EROFS || error == EMFILE ||
-         error == ENFILE || error == ENOMEM;
-}
-
 int CopyLink(int fromFolder, const char* from, int toFolder, const char* to,
              const struct stat& status) {
   std::array<char, PATH_MAX> target;
@@ -67,7 +61,7 @@ class TreeCopy {
  private:
   void fail(int error) {
     if (first_ == 0) first_ = error;
-    lost_ = lost_ || EndsTheCopy(error);
+    lost_ = lost_ || EndsEveryWrite(error);
   }
 
   static int copyFile(int fromFolder, const char* from, int toFolder, const char* to) {

@@ -20,7 +20,3 @@ KernReturn server_HvMobileHelperCopyVoicemailTokenForKey(PortName, wire::Text<25
 KernReturn server_HvMobileHelperCopyVoicemailToken(PortName, wire::Text<256>&) {
   return KERN_FAILURE;
 }
-KernReturn server_HvMobileHelperExtractArchive(PortName, wire::Text<256>&, wire::Text<256>&,
-                                               wire::Flag&) {
-  return KERN_FAILURE;
-}

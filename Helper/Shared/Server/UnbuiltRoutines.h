@@ -6,5 +6,5 @@
 #include <array>
 #include <cstdint>
 
-inline constexpr std::array<std::int32_t, 7> kUnbuiltRequestIds{8683549, 8683550, 8683551, 8683552,
-                                                                8683553, 8683554, 8683570};
+inline constexpr std::array<std::int32_t, 6> kUnbuiltRequestIds{8683549, 8683550, 8683551,
+                                                                8683552, 8683553, 8683554};
