@@ -15,8 +15,10 @@
 #include "Helper/Shared/Server/ConnectSubsystem.h"
 #include "Helper/Shared/Server/RequestCatalogue.h"
 #include "Tests/Fakes/FakeCallerSecurity.h"
+#include "Tests/Fakes/FakeMessagePorts.h"
 #include "Tests/Fakes/FakePreferencesStore.h"
 #include "Tests/Fakes/FakeSystemLog.h"
+#include "Tests/Fakes/FakeVoicemailTokenStore.h"
 #include "Tests/Support/WireClient.h"
 
 namespace {
@@ -28,6 +30,10 @@ struct Bench {
   platform::ScopedReplacement<platform::CallerSecurity> securityReplacement{security};
   fakes::FakePreferencesStore store;
   platform::ScopedReplacement<platform::PreferencesStore> storeReplacement{store};
+  fakes::FakeVoicemailTokenStore tokens;
+  platform::ScopedReplacement<platform::VoicemailTokenStore> tokensReplacement{tokens};
+  fakes::FakeMessagePorts ports;  // none is published
+  platform::ScopedReplacement<platform::MessagePorts> portsReplacement{ports};
   platform::ReceiveBuffer buffer;
   PortName port = kPortNull;
 

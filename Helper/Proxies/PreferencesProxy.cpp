@@ -10,7 +10,7 @@
 #include "Helper/Platform/PropertyList.h"
 #include "Helper/Platform/SystemLog.h"
 #include "Helper/Platform/TaskMemory.h"
-#include "Helper/Platform/Utf8.h"
+#include "Helper/Proxies/TextField.h"
 #include "Helper/Shared/Server/RequestRoutines.h"
 
 using platform::Log;
@@ -23,12 +23,6 @@ namespace {
 
 /// Kept: a value of exactly one byte, whatever the byte, means that the key is to be removed.
 constexpr std::uint32_t kRemovalByteCount = 1;
-
-std::optional<std::string> TextOf(const wire::Text<256>& field) {
-  const std::string_view text = field.view();
-  if (!platform::IsUtf8(text)) return std::nullopt;
-  return std::string(text);
-}
 
 /// Hands `value` over as an XML property list in a region of its own.
 KernReturn HandOver(const PropertyList& value, const char* allocationLine, wire::Address* address,

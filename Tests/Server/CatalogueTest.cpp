@@ -2,7 +2,6 @@
 //
 // The 23 rows against a table typed by hand, and every row over a real port.
 #include "Helper/Shared/Interface/Requests.h"
-#include "Helper/Shared/Server/UnbuiltRoutines.h"
 #include "Tests/Support/ServerFixture.h"
 
 namespace {
@@ -79,8 +78,6 @@ TEST(Catalogue, HasNoStubBelowItsFirstIdNorAboveItsLast) {
   for (const GoldenRow& row : kGolden) EXPECT_NE(demultiplex({.id = row.id}), nullptr);
 }
 
-TEST(Catalogue, LeavesSixRoutinesUnbuilt) { EXPECT_EQ(kUnbuiltRequestIds.size(), 6U); }
-
 constexpr std::int32_t kSetPreferenceValue = 8683555;
 
 class RequestWire : public support::ServerFixture {
@@ -136,16 +133,6 @@ TEST_F(RequestWire, WhoseHeaderLiesAboutItsSizeGetsMinus304) {
     Bytes bytes = support::Message(8683549, 288);
     Put(bytes, 4, size);
     EXPECT_EQ(send(bytes).bytes, errorReply(8683549, -304)) << size;
-  }
-}
-
-TEST_F(RequestWire, ThatIsNotBuiltYetAnswers5) {
-  for (const GoldenRow& row : kGolden) {
-    const bool unbuilt = std::find(kUnbuiltRequestIds.begin(), kUnbuiltRequestIds.end(), row.id) !=
-                         kUnbuiltRequestIds.end();
-    if (!unbuilt) continue;
-    EXPECT_EQ(send(support::Message(row.id, row.requestSize)).bytes, errorReply(row.id, 5))
-        << row.name;
   }
 }
 

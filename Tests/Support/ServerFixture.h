@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // A whole server inside the test: real sockets, a run loop on a manual clock, fakes for the system
-// log and for caller security.
+// log, for caller security and for the voicemail tokens.
 #pragma once
 
 #include <gtest/gtest.h>
@@ -15,6 +15,7 @@
 #include "Helper/Shared/Server/RequestCatalogue.h"
 #include "Tests/Fakes/FakeCallerSecurity.h"
 #include "Tests/Fakes/FakeSystemLog.h"
+#include "Tests/Fakes/FakeVoicemailTokenStore.h"
 #include "Tests/Fakes/ManualClock.h"
 #include "Tests/Support/WireClient.h"
 
@@ -74,6 +75,8 @@ class ServerFixture : public ::testing::Test {
   platform::ScopedReplacement<platform::SystemLog> logReplacement{log};
   fakes::FakeCallerSecurity security;
   platform::ScopedReplacement<platform::CallerSecurity> securityReplacement{security};
+  fakes::FakeVoicemailTokenStore tokens;
+  platform::ScopedReplacement<platform::VoicemailTokenStore> tokensReplacement{tokens};
   LauncherSocket launcher{wire::kServiceName};
   HelperServer* server = nullptr;
 };

@@ -1,0 +1,66 @@
+// SPDX-License-Identifier: Apache-2.0
+//
+// A voicemail token store in memory. Several stores may share one storage, as processes share the
+// file of a system. Any thread; one lock per storage.
+#pragma once
+
+#include <map>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+
+#include "Helper/Platform/VoicemailTokenStore.h"
+
+namespace fakes {
+
+class FakeVoicemailTokenStore final : public platform::VoicemailTokenStore {
+ public:
+  struct Storage {
+    std::mutex mutex;
+    std::optional<std::string> current;
+    std::map<std::string, std::string> tokens;
+    int records = 0;
+  };
+
+  FakeVoicemailTokenStore() : FakeVoicemailTokenStore(std::make_shared<Storage>()) {}
+  explicit FakeVoicemailTokenStore(std::shared_ptr<Storage> storage)
+      : storage_(std::move(storage)) {}
+
+  void setCurrentToken(const std::optional<std::string>& token) override {
+    const std::lock_guard guard(storage_->mutex);
+    storage_->current = token;
+  }
+  void setToken(const std::string& key, const std::string& token) override {
+    const std::lock_guard guard(storage_->mutex);
+    storage_->tokens.insert_or_assign(key, token);
+  }
+  std::optional<std::string> copyCurrentToken() override {
+    const std::lock_guard guard(storage_->mutex);
+    return storage_->current;
+  }
+  std::optional<std::string> copyToken(const std::string& key) override {
+    const std::lock_guard guard(storage_->mutex);
+    const auto found = storage_->tokens.find(key);
+    return found == storage_->tokens.end() ? std::nullopt : std::optional(found->second);
+  }
+  void removeAllRecords() override {
+    const std::lock_guard guard(storage_->mutex);
+    storage_->records = 0;
+  }
+
+  /// What the voicemail service itself does.
+  void addRecord() {
+    const std::lock_guard guard(storage_->mutex);
+    ++storage_->records;
+  }
+  [[nodiscard]] int records() {
+    const std::lock_guard guard(storage_->mutex);
+    return storage_->records;
+  }
+
+ private:
+  const std::shared_ptr<Storage> storage_;
+};
+
+}  // namespace fakes
