@@ -116,6 +116,31 @@ TEST_F(Links, RemovalTakesAwayFilesAndEmptyDirectoriesButNoTree) {
       << outcome.errors;
 }
 
+/// Stores "old", then sets "new", which cannot be written: it is pending in the helper alone.
+const std::string kPendingValue =
+    "folder=/root/Library/Preferences; set='halvecctl preference set com.example.domain key'\n"
+    "$set old; mount --bind $folder $folder; mount -o remount,bind,ro $folder; $set new\n"
+    "halvecctl preference get com.example.domain key\n";
+
+TEST_F(Links, WithADomainMakeTheHelperForgetWhatItHadInMemory) {
+  const Outcome outcome =
+      run(kInLibrary + kPendingValue +
+          "halvecctl bundle link t \"$link\"; halvecctl preference get com.example.domain key\n"
+          "halvecctl bundle link t \"$link\" --domain com.example.other\n"
+          "halvecctl preference get com.example.domain key\n"
+          "halvecctl bundle link t \"$link\" --domain com.example.domain\n"
+          "halvecctl preference get com.example.domain key");
+  EXPECT_EQ(outcome.output, "new\nnew\nnew\nold\n") << outcome.errors;
+}
+
+TEST_F(Links, RemovalWithADomainMakesTheHelperForgetAlsoWhenItIsRefused) {
+  const Outcome outcome =
+      run(kPendingValue +
+          "halvecctl bundle unlink /etc/passwd --domain com.example.domain 2>/dev/null; echo $?\n"
+          "halvecctl preference get com.example.domain key");
+  EXPECT_EQ(outcome.output, "new\n1\nold\n") << outcome.errors;
+}
+
 TEST_F(Loading, OfAFileThatOnlyRootMayReadAnswersItsContent) {
   const Outcome outcome =
       run("umask 077; printf '<plist><dict><key>k</key><integer>7</integer></dict></plist>' "

@@ -13,7 +13,11 @@ say() {
 }
 # Shows a command as a person would type it, then runs it.
 show() {
-  printf '$ %s\n' "$(echo "$*" | sed "s|$tools/||g")"
+  line='$'
+  for word; do
+    case $word in *' '*) line="$line '$word'" ;; *) line="$line $word" ;; esac
+  done
+  printf '%s\n' "$line" | sed "s|$tools/||g"
   "$@"
 }
 
