@@ -26,8 +26,13 @@ set(HALVEC_TOKEN_STORE "/var/lib/halvec-mobile-helper/voicemail-tokens.db" CACHE
     "File of the voicemail token store; its folder is made, readable by nobody else, when missing")
 set(HALVEC_OBSERVER_SOCKET "" CACHE STRING
     "Socket on which root watches the running helper (halvecctl status, monitor); empty: none")
+option(HALVEC_CONFINE "The helper confines itself at start, as far as its launcher has not" ON)
 
 option(HALVEC_BUILD_TESTS "Build the test programs" ON)
 option(HALVEC_BUILD_BENCHMARKS "Build the benchmark programs" ON)
 option(HALVEC_BUILD_FUZZERS "Build the fuzz targets (needs clang)" OFF)
 set(HALVEC_SANITIZE "" CACHE STRING "Sanitizers for the whole tree, for example address,undefined")
+if(HALVEC_SANITIZE)
+  # The leak detector traces the process from a process of its own, which the confinement forbids.
+  set(HALVEC_CONFINE OFF)
+endif()

@@ -1,12 +1,14 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// The entry point: create the server, run it, destroy it.
+// The entry point: confine the process, create the server, run it, destroy it.
+#include "Helper/Platform/Confinement.h"
 #include "Helper/Platform/SystemLog.h"
 #include "Helper/Shared/Interface/Connect.h"
 #include "Helper/Shared/Server/HelperServerUtils.h"
 #include "Helper/Shared/Server/RequestCatalogue.h"
 
 int main() {
+  if constexpr (HALVEC_CONFINE) platform::Confine();
   HelperServer* server = HelperServerCreate(wire::kServiceName, &RequestSubsystem());
   if (!server) {
     platform::Log(platform::LogPriority::kError, "unable to startup HalvecMobileHelper server\n");
