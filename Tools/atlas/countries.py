@@ -6,6 +6,7 @@ import json
 import multiprocessing
 
 import numpy
+from shapely.geometry import box
 
 import geobuf
 import partition
@@ -23,7 +24,10 @@ _PRECEDENCE = ("Asia/Hebron", "Asia/Gaza", "Asia/Tbilisi", "Africa/Khartoum", "A
                "Asia/Kolkata", "America/Moncton", "America/Anchorage")
 # Zones that also cover land of a second country, and how far (in degrees) that one's outline is to
 # be grown to reach the limit of its waters.
-_SHARED_ZONES = {"Europe/Belgrade": ("XK", 0.05), "Asia/Bangkok": ("VN", 0.7)}
+_SHARED_ZONES = {"Europe/Belgrade": ("XK", 0.05), "Asia/Bangkok": ("VN", 0.7),
+                 "America/New_York": ("CU", 0.2)}  # the naval base at Guantánamo
+# The same, where the source of outlines does not have the second country: west, south, east, north.
+_SHARED_BOXES = {"Europe/Oslo": ("SJ", (-12, 70, -5, 73))}  # Jan Mayen
 
 
 def zone_countries(path):
@@ -49,6 +53,8 @@ class Builder:
             grown = outline_of(country).buffer(reach).difference(
                 outline_of(self._countries[zone]))
             self._second[zone] = (country, grown)
+        for zone, (country, corners) in _SHARED_BOXES.items():
+            self._second[zone] = (country, box(*corners))
 
     def build(self):
         """The root of the country tree."""

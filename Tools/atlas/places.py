@@ -13,6 +13,8 @@ import protobuf
 # tell in which state they are.
 _CITY_PARTS = ("PPLX", "PPLH", "PPLQ", "PPLW")
 _SAME_PLACE = 0.1  # degrees between two entries of one name
+# The first level of these countries, in the list, was given up long ago; the second is used.
+_SECOND_LEVEL = ("TW",)
 _UNKNOWN_POPULATION = 500  # the first list has a floor there
 _DENSITY = 3000  # people per square kilometre of a city
 
@@ -50,18 +52,28 @@ class _Counted:
 
 def load(places_file, counted_file):
     """All places, sorted by country, name and position so that every build has the same order."""
-    with open(places_file, encoding="utf-8") as file:
-        places = [Place(entry["name"], float(entry["lat"]), float(entry["lng"]),
-                        entry["country"], entry["admin1"]) for entry in json.load(file)]
+    places = [Place(entry["name"], float(entry["lat"]), float(entry["lng"]), entry["country"],
+                    entry["admin2" if entry["country"] in _SECOND_LEVEL else "admin1"])
+              for entry in _entries(places_file)]
     _join(places, list(_counted(counted_file)))
     places.sort(key=lambda place: (place.country, place.name, place.latitude, place.longitude))
     return places
 
 
-def division_names(file_name):
-    """The names of the first-level divisions, by label (COUNTRY.CODE)."""
+def division_names(first_level, second_level):
+    """The names of the divisions, by label (COUNTRY.CODE), from the files of both levels."""
+    names = {entry["code"]: entry["name"] for entry in _entries(first_level)
+             if entry["code"][:2] not in _SECOND_LEVEL}
+    for entry in _entries(second_level):
+        country, _, code = entry["code"].split(".", 2)
+        if country in _SECOND_LEVEL:
+            names[f"{country}.{code}"] = entry["name"]
+    return names
+
+
+def _entries(file_name):
     with open(file_name, encoding="utf-8") as file:
-        return {entry["code"]: entry["name"] for entry in json.load(file)}
+        return json.load(file)
 
 
 def _counted(file_name):

@@ -30,6 +30,7 @@ extern const Command kPlistCommand;
 extern const Command kFileCommand;
 extern const Command kCrashLogsCommand;
 extern const Command kLasdCommand;
+extern const Command kLocationCommand;
 extern const Command kCallCommand;
 extern const Command kStatusCommand;
 extern const Command kMonitorCommand;

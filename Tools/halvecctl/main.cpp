@@ -89,8 +89,8 @@ void FlushOutput() {
 std::span<const Command* const> Commands() {
   static constexpr std::array kCommands{&kListCommand,      &kPreferenceCommand, &kBundleCommand,
                                         &kPathCommand,      &kPlistCommand,      &kFileCommand,
-                                        &kCrashLogsCommand, &kLasdCommand,       &kCallCommand,
-                                        &kStatusCommand,    &kMonitorCommand};
+                                        &kCrashLogsCommand, &kLasdCommand,       &kLocationCommand,
+                                        &kCallCommand,      &kStatusCommand,     &kMonitorCommand};
   return kCommands;
 }
 

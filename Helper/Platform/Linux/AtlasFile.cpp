@@ -10,7 +10,6 @@
 
 #include <bit>
 #include <cerrno>
-#include <system_error>
 #include <utility>
 
 #include "Helper/Platform/FileDescriptor.h"
@@ -75,7 +74,8 @@ std::uint32_t Crc32(AtlasBytes bytes) {
 }
 
 std::string LastError(const std::string& path) {
-  return path + ": " + std::system_category().message(errno);
+  const char* text = ::strerrordesc_np(errno);
+  return path + ": " + (text ? text : "unknown error");
 }
 
 bool HeaderIsWhole(AtlasBytes file) {
