@@ -186,7 +186,9 @@ template <class Row>
     return (wire::Load<std::uint32_t>(reply + Row::kOutputOffsets[0]) & 0xff) != 0;
   } else {
     using Field = std::tuple_element_t<0, typename Row::OutputFields>;
-    return std::string(wire::Load<Field>(reply + Row::kOutputOffsets[0]).view());
+    // A result that fills its slot has no zero, and its last byte counts.
+    const auto field = wire::Load<Field>(reply + Row::kOutputOffsets[0]);
+    return std::string(field.bytes.data(), ::strnlen(field.bytes.data(), Field::kSize));
   }
 }
 

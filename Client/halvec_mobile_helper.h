@@ -178,11 +178,12 @@ hvmh_status hvmh_move_carrier_bundles(hvmh_client* client, const char* source_pa
                                       const char* destination_directory, const char* name,
                                       bool* success, hvmh_error* error);
 
-/// Starts the search for the country of a place, in degrees. hvmh_copy_country_code() gives it.
+/// Has the civic info of a place, in degrees, delivered to the telephony daemon's connection port,
+/// within about five seconds. Stay connected until then: the helper leaves when it has no client.
 hvmh_status hvmh_request_country_code_from_location(hvmh_client* client, double latitude,
                                                     double longitude, hvmh_error* error);
 
-/// The country code found last.
+/// The country that the handset is set up for, wherever it is; empty when it does not know.
 hvmh_status hvmh_copy_country_code(hvmh_client* client, char** country_code, hvmh_error* error);
 
 /// Switches the radio manager's logging on (not 0) or off (0).

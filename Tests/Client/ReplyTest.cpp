@@ -89,7 +89,7 @@ TEST(Reply, EndsATextAtItsSlotWhenTheZeroIsMissing) {
   client.willAnswer(reply);
   char* code = nullptr;
   EXPECT_EQ(hvmh_copy_country_code(client.get(), &code, nullptr), HVMH_OK);
-  EXPECT_EQ(std::string(code), std::string(63, 'c'));
+  EXPECT_EQ(std::string(code), std::string(64, 'c'));
   hvmh_free(code);
 }
 
