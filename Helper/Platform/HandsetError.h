@@ -18,8 +18,10 @@ inline constexpr HandsetError kInputOutput = 5;
 inline constexpr HandsetError kBadDescriptor = 9;
 inline constexpr HandsetError kInvalidArgument = 22;
 inline constexpr HandsetError kWouldBlock = 35;
+inline constexpr HandsetError kMessageTooLong = 40;
 inline constexpr HandsetError kProtocolFamilyUnsupported = 46;
 inline constexpr HandsetError kAddressFamilyUnsupported = 47;
+inline constexpr HandsetError kNotConnected = 57;
 inline constexpr HandsetError kTimedOut = 60;
 inline constexpr HandsetError kHostUnreachable = 65;
 

@@ -21,15 +21,8 @@ struct TelephonyResult {
   friend bool operator==(const TelephonyResult&, const TelephonyResult&) = default;
 };
 
-/// The domain of the error codes below, which the framework itself finds. Their numbers are those
-/// of the handset's system errors.
+/// The domain of what the framework itself finds wrong; its error codes are HandsetErrors.
 inline constexpr std::int32_t kTelephonySystemDomain = 1;
-inline constexpr std::int32_t kTelephonyGarbled = 22;  // what came is no answer
-inline constexpr std::int32_t kTelephonyNotTaken =
-    35;  // the call could not be sent without waiting
-inline constexpr std::int32_t kTelephonyTooLarge = 40;  // the texts do not fit into one message
-inline constexpr std::int32_t kTelephonyClosed = 57;    // the daemon has closed the connection
-inline constexpr std::int32_t kTelephonyTimedOut = 60;  // no answer in time
 
 /// Country, state, city, postal code; null where there is no such text.
 using CivicInfoTexts = std::array<std::optional<String>, 4>;
@@ -39,8 +32,13 @@ class TelephonyConnection {
  public:
   virtual ~TelephonyConnection() = default;
 
-  /// Hands the civic info of the handset's location to the daemon and waits for its answer:
-  /// that answer, or one of the codes above in kTelephonySystemDomain.
+  /// Hands the civic info of the handset's location to the daemon and waits for its answer: that
+  /// answer; or in kTelephonySystemDomain
+  /// kInvalidArgument: what came is no answer.
+  /// kWouldBlock: the call could not be sent without waiting.
+  /// kMessageTooLong: the texts do not fit into one message; nothing was sent.
+  /// kNotConnected: the daemon has closed the connection.
+  /// kTimedOut: no answer in time.
   [[nodiscard]] virtual TelephonyResult setCivicInfo(const CivicInfoTexts& texts) = 0;
 };
 

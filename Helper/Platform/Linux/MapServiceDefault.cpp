@@ -1,10 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// The map service of this system: the online geocoder where the build names one. Until the atlas is
-// part of the program, every other look-up ends in an error, so that the configured country is what
-// gets delivered.
-#include <string_view>
+// The map service of this system: the atlas, and the online geocoder where the build names one.
+#include <string>
 
+#include "Helper/Platform/Linux/AtlasGeocoder.h"
 #include "Helper/Platform/Linux/GeocoderChain.h"
 #include "Helper/Platform/Linux/GeocodingMapService.h"
 #include "Helper/Platform/Linux/NominatimGeocoder.h"
@@ -12,22 +11,15 @@
 namespace platform {
 namespace {
 
-constexpr std::string_view kEndpoint = HALVEC_GEOCODER_ENDPOINT;
 /// Less than the five seconds after which nobody waits for the answer any more.
 constexpr Duration kOnlineLimit = std::chrono::seconds(4);
 
-class NoGeocoder final : public ReverseGeocoder {
- public:
-  GeocodeAnswer lookUp(const Coordinate& /*place*/) override {
-    return GeocodeError{"no geocoder is installed"};
-  }
-};
-
 MapService& MakeMapService() {
-  auto& offline = *new NoGeocoder;
-  if (kEndpoint.empty()) return *new GeocodingMapService(offline, offline);
-  auto& online = *new NominatimGeocoder(std::string(kEndpoint), kOnlineLimit);
-  return *new GeocodingMapService(*new GeocoderChain(offline, online), offline);
+  auto& atlas = *new AtlasGeocoder(HALVEC_ATLAS_FILE);
+  const std::string endpoint = HALVEC_GEOCODER_ENDPOINT;
+  if (endpoint.empty()) return *new GeocodingMapService(atlas, atlas);
+  auto& online = *new NominatimGeocoder(endpoint, kOnlineLimit);
+  return *new GeocodingMapService(*new GeocoderChain(atlas, online), atlas);
 }
 
 }  // namespace

@@ -13,6 +13,7 @@
 #include <variant>
 
 #include "Helper/Platform/FileDescriptor.h"
+#include "Helper/Platform/HandsetError.h"
 #include "Helper/Platform/Linux/MessagePortSocket.h"
 #include "Helper/Platform/PropertyList.h"
 #include "Helper/Shared/Interface/TelephonyConnection.h"
@@ -24,7 +25,7 @@ constexpr Duration kAnswerLimit = std::chrono::seconds(1);
 
 using Datagram = std::vector<std::byte>;
 
-TelephonyResult Failure(std::int32_t errorCode) {
+TelephonyResult Failure(HandsetError errorCode) {
   return {.domain = kTelephonySystemDomain, .errorCode = errorCode};
 }
 
@@ -54,11 +55,12 @@ class Connection final : public TelephonyConnection {
 
   TelephonyResult setCivicInfo(const CivicInfoTexts& texts) override {
     const std::optional<Datagram> payload = SerializeBinary(CivicInfo(texts));
-    if (!payload || payload->size() > wire::kOneWayPayloadLimit) return Failure(kTelephonyTooLarge);
+    if (!payload || payload->size() > wire::kOneWayPayloadLimit)
+      return Failure(handset::kMessageTooLong);
     const Datagram message =
         wire::EncodeOneWay({.id = wire::kTelephonySetCivicInfo, .payload = *payload});
     if (::send(socket_.get(), message.data(), message.size(), MSG_DONTWAIT | MSG_NOSIGNAL) < 0) {
-      return Failure(errno == EAGAIN ? kTelephonyNotTaken : kTelephonyClosed);
+      return Failure(errno == EAGAIN ? handset::kWouldBlock : handset::kNotConnected);
     }
     return awaitAnswer();
   }
@@ -70,14 +72,14 @@ class Connection final : public TelephonyConnection {
       const std::variant<Datagram, TelephonyResult> arrival = receive(deadline);
       if (const auto* failure = std::get_if<TelephonyResult>(&arrival)) return *failure;
       const auto message = wire::DecodeOneWay(std::get<Datagram>(arrival));
-      if (!message) return Failure(kTelephonyGarbled);
+      if (!message) return Failure(handset::kInvalidArgument);
       if (message->id == wire::kTelephonyNotification) {
         callback_(this, context_);
         continue;
       }
       if (message->id != wire::kTelephonyCivicInfoAnswer ||
           message->payload.size() != wire::kTelephonyAnswerSize) {
-        return Failure(kTelephonyGarbled);
+        return Failure(handset::kInvalidArgument);
       }
       const auto answer = wire::Load<wire::TelephonyAnswer>(message->payload.data());
       return {.domain = answer.domain, .errorCode = answer.errorCode};
@@ -88,18 +90,18 @@ class Connection final : public TelephonyConnection {
   std::variant<Datagram, TelephonyResult> receive(TimePoint deadline) {
     for (;;) {
       // Asked here too, because a daemon that never stops sending keeps the wait from timing out.
-      if (std::chrono::steady_clock::now() >= deadline) return Failure(kTelephonyTimedOut);
+      if (std::chrono::steady_clock::now() >= deadline) return Failure(handset::kTimedOut);
       pollfd entry{.fd = socket_.get(), .events = POLLIN | POLLRDHUP, .revents = 0};
       if (::poll(&entry, 1, MillisecondsUntil(deadline)) <= 0) continue;
       const ssize_t length = ::recv(socket_.get(), nullptr, 0, MSG_PEEK | MSG_TRUNC | MSG_DONTWAIT);
       // An empty packet looks like the end of the stream; only the hang-up tells them apart.
       const bool ended = length == 0 && (entry.revents & (POLLHUP | POLLRDHUP)) != 0;
       if (ended || (length < 0 && errno != EAGAIN && errno != EINTR)) {
-        return Failure(kTelephonyClosed);
+        return Failure(handset::kNotConnected);
       }
       if (length < 0) continue;
       if (static_cast<std::size_t>(length) > wire::OneWaySize(wire::kOneWayPayloadLimit)) {
-        return Failure(kTelephonyGarbled);
+        return Failure(handset::kInvalidArgument);
       }
       // Descriptors that come along find no room here, so the kernel closes them.
       Datagram packet(static_cast<std::size_t>(length));
