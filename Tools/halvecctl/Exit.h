@@ -17,7 +17,7 @@ enum class ExitCode {
   kNotConnected = 3,  // nobody serves the service socket, or it does not admit this user
   kRefused = 4,       // the helper answered 35: this program does not hold the entitlement
   kLost = 5,          // no answer in time, the helper went away, or its answer was ill-formed
-  kAbsent = 6,        // the preference has no value
+  kAbsent = 6,        // the preference has no value, or the country is not known
   kSystem = 7         // this program itself failed: memory, a system call, writing its output
 };
 

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// halvecctl location: what the offline geocoder answers from. Needs no helper.
+// halvecctl location: where a coordinate is, where the handset is set up for, and what the offline
+// geocoder answers from.
 #include <cstdio>
 #include <optional>
 #include <string>
@@ -10,6 +11,7 @@
 #include "Helper/Platform/MapAttributions.h"
 #include "Tools/halvecctl/Command.h"
 #include "Tools/halvecctl/Json.h"
+#include "Tools/halvecctl/LocationRequests.h"
 
 namespace halvecctl {
 namespace {
@@ -31,18 +33,25 @@ ExitCode RunAbout(const GlobalOptions& options, Words words) {
 
 ExitCode RunLocation(const GlobalOptions& options, Words words) {
   const std::optional<std::string> action = words.takeFirst();
-  if (!action) throw UsageFailure("expected about; see halvecctl location --help");
+  if (!action) {
+    throw UsageFailure("expected resolve, country or about; see halvecctl location --help");
+  }
+  if (*action == "resolve") return RunResolve(options, std::move(words));
+  if (*action == "country") return RunCountry(options, std::move(words));
   if (*action == "about") return RunAbout(options, std::move(words));
   throw UsageFailure("unknown action '" + *action + "'; see halvecctl location --help");
 }
 
 }  // namespace
 
-constinit const Command kLocationCommand{"location", "about [--atlas PATH]",
-                                         "tell whose data the offline geocoder answers from",
-                                         "Prints the date, sources and licences of the atlas at "
-                                         "PATH, or of the installed one. Needs no\n"
-                                         "helper.\n",
-                                         RunLocation};
+constinit const Command kLocationCommand{
+    "location", "resolve LATITUDE LONGITUDE [--wait] | country | about [--atlas PATH]",
+    "have a coordinate turned into country, state and city",
+    "resolve  has the civic info of a place, in degrees, delivered to the telephony daemon. With\n"
+    "         --wait it stands in for that daemon, where there is none, and prints what comes.\n"
+    "country  prints the country that the handset is set up for; 6 is the exit code without one\n"
+    "about    prints the date, sources and licences of the atlas at PATH, or of the installed\n"
+    "         one. Needs no helper.\n",
+    RunLocation};
 
 }  // namespace halvecctl

@@ -61,6 +61,18 @@ int MillisecondsUntil(std::chrono::steady_clock::time_point deadline) {
 
 }  // namespace
 
+void AwaitPacket(int socket, int helper, std::chrono::steady_clock::time_point deadline) {
+  for (;;) {
+    std::array<pollfd, 2> entries{{{.fd = socket, .events = POLLIN, .revents = 0},
+                                   {.fd = helper, .events = 0, .revents = 0}}};
+    const int ready = ::poll(entries.data(), entries.size(), MillisecondsUntil(deadline));
+    if (ready == 0) throw Failure(ExitCode::kLost, "nothing was told in time");
+    if (ready < 0) continue;
+    if (entries[0].revents != 0) return;
+    throw Failure(ExitCode::kLost, "the helper went away");
+  }
+}
+
 PublishedPort::PublishedPort(const std::string& servicePath, const std::string& name)
     : path_(PathBeside(servicePath, name)), socket_(MakeSocket()) {
   const sockaddr_un address = AddressOf(path_);
@@ -82,19 +94,12 @@ std::vector<std::byte> PublishedPort::receive(int helper,
                                               std::chrono::steady_clock::time_point deadline) {
   std::vector<std::byte> datagram(wire::OneWaySize(wire::kOneWayPayloadLimit));
   for (;;) {
+    AwaitPacket(socket_.get(), helper, deadline);
     const ssize_t length =
         ::recv(socket_.get(), datagram.data(), datagram.size(), MSG_DONTWAIT | MSG_TRUNC);
-    if (length >= 0) {
-      datagram.resize(std::min(static_cast<std::size_t>(length), datagram.size()));
-      return datagram;
-    }
-    std::array<pollfd, 2> entries{{{.fd = socket_.get(), .events = POLLIN, .revents = 0},
-                                   {.fd = helper, .events = 0, .revents = 0}}};
-    const int ready = ::poll(entries.data(), entries.size(), MillisecondsUntil(deadline));
-    if (ready == 0) throw Failure(ExitCode::kLost, "nothing was told in time");
-    if (ready > 0 && entries[0].revents == 0) {
-      throw Failure(ExitCode::kLost, "the helper went away");
-    }
+    if (length < 0) continue;
+    datagram.resize(std::min(static_cast<std::size_t>(length), datagram.size()));
+    return datagram;
   }
 }
 

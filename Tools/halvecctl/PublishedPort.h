@@ -12,6 +12,10 @@
 
 namespace halvecctl {
 
+/// Waits until something is at `socket`. Throws Failure when nothing has come by `deadline`, or
+/// when `helper`, a descriptor that shows when the helper goes away, hangs up.
+void AwaitPacket(int socket, int helper, std::chrono::steady_clock::time_point deadline);
+
 class PublishedPort {
  public:
   /// Publishes the port `name` beside the service socket at `servicePath`. Throws Failure when
@@ -21,8 +25,10 @@ class PublishedPort {
   PublishedPort(const PublishedPort&) = delete;
   PublishedPort& operator=(const PublishedPort&) = delete;
 
-  /// The next datagram; waits for it. Throws Failure when none has come by `deadline`, or when
-  /// `helper`, a descriptor that shows when the helper goes away, hangs up.
+  /// Borrowed, for what receive() does not do.
+  [[nodiscard]] int descriptor() const { return socket_.get(); }
+
+  /// The next datagram; waits for it as AwaitPacket() does.
   [[nodiscard]] std::vector<std::byte> receive(int helper,
                                                std::chrono::steady_clock::time_point deadline);
 

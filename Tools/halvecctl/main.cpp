@@ -20,7 +20,7 @@ constexpr std::string_view kExitCodes =
     "  3  not connected: the service is not running or does not admit this user\n"
     "  4  refused: this program does not hold the entitlement\n"
     "  5  no answer in time, the helper went away, or its answer was ill-formed\n"
-    "  6  the preference has no value\n"
+    "  6  the preference has no value, or the country is not known\n"
     "  7  this program itself failed\n";
 
 constexpr std::string_view kGlobalOptions =
