@@ -4,8 +4,8 @@
 #include <netdb.h>
 #include <netinet/in.h>
 #include <poll.h>
+#include <stdlib.h>
 #include <strings.h>
-#include <sys/random.h>
 #include <sys/socket.h>
 
 #include <algorithm>
@@ -168,9 +168,10 @@ class Exchange {
  public:
   Exchange(const SocketAddress& server, const std::string& host, TimePoint deadline)
       : server_(server), deadline_(deadline) {
-    std::array<std::uint16_t, kTypes.size()> ids{};
-    (void)::getrandom(ids.data(), sizeof ids, 0);                // never fails for so few bytes
-    ids[1] = static_cast<std::uint16_t>(ids[0] ^ (ids[1] | 1));  // never the same
+    const std::uint32_t random = ::arc4random();
+    const auto first = static_cast<std::uint16_t>(random);
+    // Never the same, so that no reply answers both.
+    const std::array ids{first, static_cast<std::uint16_t>(first ^ (random >> 16 | 1))};
     for (std::size_t i = 0; i < kTypes.size(); ++i) {
       questions_[i].query = EncodeDnsQuery(ids[i], host, kTypes[i]);
     }
