@@ -12,6 +12,7 @@
 #include "Tools/handset/Failure.h"
 #include "Tools/handset/Json.h"
 #include "Tools/handset/Mounts.h"
+#include "Tools/handset/NameServer.h"
 #include "Tools/handset/Options.h"
 #include "Tools/handset/Packet.h"
 #include "Tools/handset/SignalName.h"
@@ -124,12 +125,16 @@ TEST(MountPoints, AreTheTopmostOnesBelowAFolder) {
 }
 
 TEST(RunOptions, AreTakenApart) {
-  const RunOptions options =
-      ParseRunOptions({"--helper", "/h", "--bind=/a:/b", "--bind", "/c", "--install", "/x/y",
-                       "--install=/x/y:z", "--queue=512", "--verbose", "--", "cmd", "--helper"});
+  const RunOptions options = ParseRunOptions(
+      {"--helper", "/h", "--bind=/a:/b", "--bind", "/c", "--install", "/x/y", "--install=/x/y:z",
+       "--queue=512", "--verbose", "--no-telephony", "--web", "/w", "--", "cmd", "--helper"});
   EXPECT_EQ(options.helper, "/h");
   EXPECT_TRUE(options.verbose);
   EXPECT_EQ(options.queue, 512U);
+  EXPECT_FALSE(options.hasTelephony);
+  EXPECT_TRUE(options.hasNetwork);
+  EXPECT_EQ(options.webDirectory, "/w");
+  EXPECT_EQ(options.webHosts, std::vector<std::string>{HALVEC_MANIFEST_HOST});
   using Pairs = std::vector<std::pair<std::string, std::string>>;
   EXPECT_EQ(options.binds, (Pairs{{"/a", "/b"}, {"/c", "/c"}}));
   EXPECT_EQ(options.installs, (Pairs{{"/x/y", "y"}, {"/x/y", "z"}}));
@@ -320,6 +325,99 @@ TEST(TelephonyMessage, BelongsToOnePort) {
   EXPECT_EQ(fault(kConnectionPort, std::nullopt, kCivicMessage), unknown);
   EXPECT_EQ(fault(kConnectionPort, 1, kConnectMessage), "no port descriptor");
   EXPECT_NE(fault(kConnectionPort, 1, kCivicMessage), unknown);
+}
+
+std::string Query(const std::string& hex) {
+  return BytesOfHex(
+      "0007"
+      "0100"
+      "0001000000000000" +
+      hex);
+}
+
+std::string AnswerHex(const std::string& query) {
+  const auto answer = AnswerNameQuery(query, {"a.bc"}, {192, 0, 2, 1});
+  return answer ? HexOf(*answer) : "none";
+}
+
+TEST(NameQuery, IsAnsweredWithTheQuestionAndAtMostOneRecord) {
+  EXPECT_EQ(AnswerHex(Query("0161026263"
+                            "00"
+                            "0001"
+                            "0001")),
+            "0007"
+            "8580"
+            "0001000100000000"
+            "0161026263"
+            "00"
+            "0001"
+            "0001"
+            "c00c"
+            "0001"
+            "0001"
+            "00000000"
+            "0004"
+            "c0000201");
+  EXPECT_EQ(AnswerHex(Query("0141024243"
+                            "00"
+                            "001c"
+                            "0001")),
+            "0007"
+            "8580"
+            "0001000000000000"
+            "0141024243"
+            "00"
+            "001c"
+            "0001");
+  EXPECT_EQ(AnswerHex(Query("0161"
+                            "00"
+                            "0001"
+                            "0001")),
+            "0007"
+            "8583"
+            "0001000000000000"
+            "0161"
+            "00"
+            "0001"
+            "0001");
+}
+
+TEST(NameQuery, MayBeFollowedByOtherRecords) {
+  std::string query = Query(
+      "0161026263"
+      "00"
+      "0001"
+      "0001"
+      "0000291000000000000000");
+  query[11] = 1;  // an additional record
+  EXPECT_EQ(AnswerHex(query).substr(0, 24), "000785800001000100000000");
+}
+
+TEST(NameQuery, IsNotAnsweredWhereItIsNone) {
+  const std::string good = Query(
+      "0161026263"
+      "00"
+      "0001"
+      "0001");
+  for (std::size_t length = 0; length < good.size(); ++length) {
+    EXPECT_EQ(AnswerHex(good.substr(0, length)), "none") << length;
+  }
+  EXPECT_EQ(AnswerHex(Query("c00c"
+                            "0001"
+                            "0001")),
+            "none")
+      << "a pointer";
+  EXPECT_EQ(AnswerHex(Query("0161026263"
+                            "00"
+                            "0001"
+                            "0003")),
+            "none")
+      << "another class";
+  for (const std::size_t position : {2U, 5U}) {
+    std::string other = good;
+    other[position] = static_cast<char>(0x90);
+    EXPECT_EQ(AnswerHex(other), "none") << "a response, or not one question";
+  }
 }
 
 TEST(HandsetEventLoop, RunsDeadlinesInTimeAndNoCancelledOne) {

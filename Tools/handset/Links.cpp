@@ -17,6 +17,7 @@
 
 #include "Tools/handset/Failure.h"
 #include "Tools/handset/Files.h"
+#include "Tools/handset/Network.h"
 #include "Tools/handset/Options.h"
 
 namespace handset {
@@ -149,7 +150,11 @@ const Link& RequireLink(const std::string& name) {
 
 Links::Links(const World& world) : world_(world), worldRoutes_(RoutesOf(world)) {
   Prepare();
-  world_.inside(Prepare);
+  world_.inside([] {
+    Prepare();
+    Network().bringUpLoopback();
+  });
+  AddAddress(worldRoutes_, worldRoutes_.indexOf("lo"), kWorldAddress, kSingleHost);
 }
 
 void Links::add(const Link& link) {

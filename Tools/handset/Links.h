@@ -26,6 +26,9 @@ struct Link {
   unsigned metric;                  ///< Of the default route over this link; the lowest wins.
 };
 
+/// An address of the world itself, to which either link leads: servers may listen there.
+inline constexpr const char* kWorldAddress = "198.51.100.1";
+
 /// The two links: cellular first.
 [[nodiscard]] const std::vector<Link>& AllLinks();
 
@@ -45,7 +48,8 @@ struct Counters {
 
 class Links {
  public:
-  /// Prepares both sides (reverse-path filters and IPv6 of later interfaces off); throws Failure.
+  /// Prepares both sides: the world has its own address, reverse-path filters and IPv6 of later
+  /// interfaces are off. Throws Failure.
   explicit Links(const World& world);
 
   /// Makes both interfaces of the link, with addresses and default route, and takes them up; throws

@@ -19,6 +19,15 @@ std::pair<std::string, std::string> Pair(const std::string& text) {
   return {text.substr(0, colon), text.substr(colon + 1)};
 }
 
+void CompleteWeb(RunOptions& options) {
+  if (options.webDirectory.empty()) {
+    if (!options.webHosts.empty()) RefuseUsage("--web-host needs --web");
+    return;
+  }
+  if (!options.hasNetwork) RefuseUsage("--web needs the network");
+  if (options.webHosts.empty()) options.webHosts.emplace_back(HALVEC_MANIFEST_HOST);
+}
+
 }  // namespace
 
 void RefuseUsage(const std::string& text) {
@@ -98,6 +107,10 @@ RunOptions ParseRunOptions(const std::vector<std::string>& arguments) {
       options.user = reader.value();
     } else if (*option == "--env-as") {
       options.environmentUser = reader.value();
+    } else if (*option == "--web") {
+      options.webDirectory = reader.value();
+    } else if (*option == "--web-host") {
+      options.webHosts.push_back(reader.value());
     } else if (*option == "--no-network") {
       options.hasNetwork = false;
     } else if (*option == "--no-telephony") {
@@ -119,6 +132,7 @@ RunOptions ParseRunOptions(const std::vector<std::string>& arguments) {
       RefuseUsage("unknown option " + *option);
     }
   }
+  CompleteWeb(options);
   options.command = reader.rest();
   if (options.command.empty()) RefuseUsage("run needs a command");
   return options;

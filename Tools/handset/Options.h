@@ -11,16 +11,18 @@
 namespace handset {
 
 struct RunOptions {
-  std::string helper;             ///< Host path of the helper; empty: none given.
-  bool verbose = false;           ///< Show log lines and helper starts on standard error.
-  std::string logFile;            ///< Host path, appended to; empty: none.
-  std::string eventsFile;         ///< Host path, appended to; empty: none.
-  std::string stateDirectory;     ///< Host folder that keeps the handset's data; empty: none.
-  std::string user = "root";      ///< Whom the command runs as.
-  std::string environmentUser;    ///< Whose clean environment it gets; empty: the caller's.
-  std::optional<unsigned> queue;  ///< Datagrams that a named port queues; none: kernel's own.
-  bool hasNetwork = true;         ///< The links to the world are there from the start.
-  bool hasTelephony = true;       ///< The stand-in telephony daemon runs from the start.
+  std::string helper;                 ///< Host path of the helper; empty: none given.
+  bool verbose = false;               ///< Show log lines and helper starts on standard error.
+  std::string logFile;                ///< Host path, appended to; empty: none.
+  std::string eventsFile;             ///< Host path, appended to; empty: none.
+  std::string stateDirectory;         ///< Host folder that keeps the handset's data; empty: none.
+  std::string user = "root";          ///< Whom the command runs as.
+  std::string environmentUser;        ///< Whose clean environment it gets; empty: the caller's.
+  std::optional<unsigned> queue;      ///< Datagrams that a named port queues; none: kernel's own.
+  std::string webDirectory;           ///< Host folder that the web serves; empty: no web.
+  std::vector<std::string> webHosts;  ///< The web's names; empty: no web.
+  bool hasNetwork = true;             ///< The links to the world are there from the start.
+  bool hasTelephony = true;           ///< The stand-in telephony daemon runs from the start.
   std::vector<std::pair<std::string, std::string>> binds;     ///< Host path, path inside.
   std::vector<std::pair<std::string, std::string>> installs;  ///< Host path, name inside.
   std::vector<std::string> command;                           ///< Never empty.

@@ -4,6 +4,8 @@
 #include "Tools/handset/Process.h"
 
 #include <signal.h>
+#include <sys/mman.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -11,7 +13,9 @@
 #include <cstdio>
 #include <string_view>
 
+#include "Helper/Platform/FileDescriptor.h"
 #include "Tools/handset/Failure.h"
+#include "Tools/handset/Files.h"
 #include "Tools/handset/Root.h"
 
 namespace handset {
@@ -114,6 +118,24 @@ void BecomeProgram(const std::vector<std::string>& arguments, const Environment&
   }
   throw Failure("cannot run " + arguments[0] + ": " + std::generic_category().message(error),
                 error == ENOENT ? kStatusNotFound : kStatusNotExecutable);
+}
+
+void RunTool(const std::vector<std::string>& arguments) {
+  const platform::FileDescriptor said(memfd_create("output", MFD_CLOEXEC));
+  if (!said) throw Failure::FromErrno("memfd_create");
+  const pid_t tool = StartProgram(arguments, [&said] {
+    if (dup2(said.get(), STDOUT_FILENO) < 0 || dup2(said.get(), STDERR_FILENO) < 0) {
+      throw Failure::FromErrno("dup2");
+    }
+    return ServiceEnvironment();
+  });
+  int waitStatus = 0;
+  while (waitpid(tool, &waitStatus, 0) < 0) {
+    if (errno != EINTR) throw Failure::FromErrno("wait for " + arguments[0]);
+  }
+  if (waitStatus == 0) return;
+  throw Failure(arguments[0] +
+                " failed: " + ReadWholeFile("/proc/self/fd/" + std::to_string(said.get())));
 }
 
 pid_t StartProgram(const std::vector<std::string>& arguments,

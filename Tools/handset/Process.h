@@ -41,6 +41,10 @@ void AddInstalledToPath(Environment& environment);
 [[nodiscard]] pid_t StartProgram(const std::vector<std::string>& arguments,
                                  const std::function<Environment()>& prepare);
 
+/// Runs a program of the system to its end, in the environment of a service. Throws Failure, with
+/// what the program said, unless it ends with status 0.
+void RunTool(const std::vector<std::string>& arguments);
+
 /// Becomes the program, which is searched in the PATH of `environment` unless its name has a
 /// slash. Throws Failure, with kStatusNotFound or kStatusNotExecutable, where it cannot.
 [[noreturn]] void BecomeProgram(const std::vector<std::string>& arguments,

@@ -22,6 +22,7 @@
 #include "Tools/handset/Files.h"
 #include "Tools/handset/Mounts.h"
 #include "Tools/handset/UserDatabase.h"
+#include "Tools/handset/WebServer.h"
 
 namespace handset {
 namespace {
@@ -106,6 +107,10 @@ FromHost TakeFromHost(const RunOptions& options) {
   }
   for (const auto& [source, path] : options.binds) {
     host.binds.push_back(Take(source, path, Access::kReadWrite));
+  }
+  if (!options.webDirectory.empty()) {
+    host.binds.push_back(Take(options.webDirectory, kWebFolder, Access::kReadWrite));
+    if (!host.binds.back().directory) throw Failure("--web needs a folder");
   }
   if (!options.stateDirectory.empty()) TakeState(options.stateDirectory, host);
   for (const char* device : kDevices) {

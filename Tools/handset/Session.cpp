@@ -109,6 +109,7 @@ void Session::reap() {
       loop_.stop();
     }
     launcher_.childEnded(pid, waitStatus);
+    if (surroundings_) surroundings_->childEnded(pid);
   }
 }
 
@@ -145,9 +146,6 @@ void Session::answerQuestions() {
 int Session::run() {
   Network network;
   network.bringUpLoopback();
-  if (options_.hasNetwork) {
-    surroundings_ = std::make_unique<Surroundings>(loop_, [this] { control_.lookAtWaits(); });
-  }
   watchSignals();
   capture_.onEntry([this] { control_.lookAtWaits(); });
   launcher_.onChange([this] { control_.lookAtWaits(); });
@@ -156,6 +154,10 @@ int Session::run() {
   const unsigned kernelsOwn = network.datagramQueue();
   network.setDatagramQueue(kLogQueue);
   capture_.open();
+  if (options_.hasNetwork) {
+    surroundings_ = std::make_unique<Surroundings>(loop_, options_.webHosts,
+                                                   [this] { control_.lookAtWaits(); });
+  }
   network.setDatagramQueue(options_.queue.value_or(kernelsOwn));
   launcher_.open();
   if (options_.hasTelephony) telephony_.start();

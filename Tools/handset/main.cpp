@@ -36,6 +36,8 @@ ends with COMMAND's exit status. Needs root; leaves nothing behind.
   --state DIR         keep /var/mobile, /Library and /var/lib/halvec in DIR
   --bind SRC[:DST]    show SRC of the host, writable, at DST (default: as SRC)
   --install SRC[:NAME]  copy an executable to /usr/libexec/halvec/NAME
+  --web DIR           serve DIR by https, where only this handset trusts the server
+  --web-host NAME     the server's name (default: the LASD manifest's host); may be repeated
   --no-network        leave the links to the world out
   --no-telephony      leave the stand-in telephony daemon out
   --queue N           datagrams that a named port queues (default: the kernel's)
@@ -59,6 +61,9 @@ Inside:
       [--json] [INTERFACE]
   handset tower reply on|off
   handset tower send HEX
+  handset web log [--skip N] [--count N] [--timeout SECONDS]
+  handset web start|stop
+  handset web dns on|off
   handset world [--] COMMAND [ARGUMENT]...
   handset entitle EXECUTABLE USER [--name NAME] [--value FRAGMENT]... [--unchecked]
 
