@@ -43,16 +43,17 @@ TEST(HalvecctlList, TakesGlobalOptionsBeforeTheCommandToo) {
 TEST(HalvecctlHelp, NamesEveryCommandAndExitCode) {
   const Outcome outcome = RunProgram({"--help"});
   EXPECT_EQ(outcome.exitCode, 0);
-  for (const char* text :
-       {"list ", "preference ", "bundle ", "path ", "plist ", "file ", "crash-logs ", "lasd ",
-        "call ", "status ", "monitor ", "--timeout", "  6  the preference"}) {
+  for (const char* text : {"list ", "preference ", "bundle ", "path ", "plist ", "file ",
+                           "crash-logs ", "lasd ", "voicemail ", "heartbeat ", "radio-log ",
+                           "call ", "status ", "monitor ", "--timeout", "  6  there is none"}) {
     EXPECT_NE(outcome.output.find(text), std::string::npos) << text;
   }
 }
 
 TEST(HalvecctlHelp, ExistsForEveryCommand) {
-  for (const char* command : {"list", "preference", "bundle", "path", "plist", "file", "crash-logs",
-                              "lasd", "call", "status", "monitor"}) {
+  for (const char* command :
+       {"list", "preference", "bundle", "path", "plist", "file", "crash-logs", "lasd", "voicemail",
+        "heartbeat", "radio-log", "call", "status", "monitor"}) {
     const Outcome outcome = RunProgram({command, "--help"});
     EXPECT_EQ(outcome.exitCode, 0);
     EXPECT_EQ(outcome.output.find("Usage: halvecctl " + std::string(command)), 0U);
@@ -116,6 +117,21 @@ TEST(HalvecctlUsage, ErrorsAreOneSentenceAndExitWithTwo) {
       {{"crash-logs"}, "expected copy"},
       {{"crash-logs", "move"}, "unknown action 'move'"},
       {{"crash-logs", "copy"}, "expected SOURCE, got 0 arguments"},
+      {{"voicemail"}, "expected token, subscribed or reset"},
+      {{"voicemail", "listen"}, "unknown action 'listen'"},
+      {{"voicemail", "subscribed", "now"}, "expected no arguments, got 1 argument"},
+      {{"voicemail", "reset", "now"}, "expected no arguments, got 1 argument"},
+      {{"voicemail", "token"}, "expected get, set or clear"},
+      {{"voicemail", "token", "mint"}, "unknown action 'token mint'"},
+      {{"voicemail", "token", "set"}, "expected TOKEN, got 0 arguments"},
+      {{"voicemail", "token", "set", "a", "b"}, "expected TOKEN, got 2 arguments"},
+      {{"voicemail", "token", "get", "key"}, "expected no arguments, got 1 argument"},
+      {{"voicemail", "token", "get", "--key"}, "option --key needs a value"},
+      {{"heartbeat"}, "expected start or stop"},
+      {{"heartbeat", "on"}, "unknown action 'on'"},
+      {{"heartbeat", "start", "twice"}, "expected no arguments, got 1 argument"},
+      {{"radio-log"}, "expected on or off"},
+      {{"radio-log", "start"}, "unknown action 'start'"},
       {{"lasd"}, "expected update or status"},
       {{"lasd", "downgrade"}, "unknown action 'downgrade'"},
       {{"lasd", "status", "gsm"}, "expected no arguments, got 1 argument"},

@@ -2,7 +2,6 @@
 //
 // halvecctl bundle: the links by which the mobile user's library points at carrier bundles, and the
 // bundles themselves.
-#include <cstdio>
 #include <optional>
 #include <string>
 #include <utility>
@@ -14,12 +13,6 @@
 namespace halvecctl {
 namespace {
 
-ExitCode Finish(const halvec::Error& error, const GlobalOptions& options) {
-  if (error.failed()) throw RequestFailure(error);
-  if (options.json) std::fputs("{\"code\":0,\"codeName\":\"KERN_SUCCESS\"}\n", stdout);
-  return ExitCode::kDone;
-}
-
 ExitCode RunLink(const GlobalOptions& options, Words words) {
   const bool unchecked = words.takeOption("--unchecked");
   const std::optional<std::string> domain = words.takeOptionWithValue("--domain");
@@ -27,9 +20,10 @@ ExitCode RunLink(const GlobalOptions& options, Words words) {
   const std::vector<std::string> texts = words.takeAll(2, "TARGET LINK-PATH");
   halvec::HelperClient client = Connect(options);
   if (unchecked) {
-    return Finish(client.call<requests::CreateSymlink>(texts[0], texts[1]).error(), options);
+    return FinishWithCode(client.call<requests::CreateSymlink>(texts[0], texts[1]).error(),
+                          options);
   }
-  return Finish(
+  return FinishWithCode(
       client
           .call<requests::SetCarrierBundleLink>(texts[0], texts[1], domain.value_or(std::string()))
           .error(),
@@ -40,7 +34,7 @@ ExitCode RunUnlink(const GlobalOptions& options, Words words) {
   const std::optional<std::string> domain = words.takeOptionWithValue("--domain");
   const std::vector<std::string> texts = words.takeAll(1, "PATH");
   halvec::HelperClient client = Connect(options);
-  return Finish(
+  return FinishWithCode(
       client.call<requests::RemoveCarrierBundleLink>(texts[0], domain.value_or(std::string()))
           .error(),
       options);

@@ -31,12 +31,19 @@ extern const Command kFileCommand;
 extern const Command kCrashLogsCommand;
 extern const Command kLasdCommand;
 extern const Command kLocationCommand;
+extern const Command kVoicemailCommand;
+extern const Command kHeartbeatCommand;
+extern const Command kRadioLogCommand;
 extern const Command kCallCommand;
 extern const Command kStatusCommand;
 extern const Command kMonitorCommand;
 
 /// Every command, in the order of --help.
 [[nodiscard]] std::span<const Command* const> Commands();
+
+/// Ends a command whose request answers with a return code alone: throws Failure for one that is
+/// not 0.
+[[nodiscard]] ExitCode FinishWithCode(const halvec::Error& error, const GlobalOptions& options);
 
 /// Ends a command whose request answers with a success flag: throws Failure where it is false.
 [[nodiscard]] ExitCode FinishWithFlag(const halvec::Result<bool>& success,

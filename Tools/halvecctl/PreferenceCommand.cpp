@@ -59,11 +59,6 @@ std::vector<std::byte> ReadPropertyListFile(const std::string& path) {
   return bytes;
 }
 
-void RequireDone(const halvec::Error& error, const GlobalOptions& options) {
-  if (error.failed()) throw RequestFailure(error);
-  if (options.json) Print("{\"code\":0,\"codeName\":\"KERN_SUCCESS\"}\n");
-}
-
 ExitCode RunSet(const GlobalOptions& options, Words words) {
   std::vector<std::string_view> types;
   for (const std::string_view type : {"--string", "--integer", "--real", "--boolean"}) {
@@ -77,10 +72,9 @@ ExitCode RunSet(const GlobalOptions& options, Words words) {
       file ? ReadPropertyListFile(*file)
            : Serialize(ParseValue(texts[2], types.empty() ? "--string" : types.front()));
   halvec::HelperClient client = Connect(options);
-  RequireDone(
+  return FinishWithCode(
       client.call<requests::SetPreferenceValue>(texts[0], texts[1], std::span(value)).error(),
       options);
-  return ExitCode::kDone;
 }
 
 ExitCode RunRemove(const GlobalOptions& options, Words words) {
@@ -88,10 +82,9 @@ ExitCode RunRemove(const GlobalOptions& options, Words words) {
   // A value of exactly one byte, whichever, removes the key.
   constexpr std::array kRemoval{std::byte{0}};
   halvec::HelperClient client = Connect(options);
-  RequireDone(
+  return FinishWithCode(
       client.call<requests::SetPreferenceValue>(texts[0], texts[1], std::span(kRemoval)).error(),
       options);
-  return ExitCode::kDone;
 }
 
 ExitCode RunGet(const GlobalOptions& options, Words words) {

@@ -20,7 +20,7 @@ constexpr std::string_view kExitCodes =
     "  3  not connected: the service is not running or does not admit this user\n"
     "  4  refused: this program does not hold the entitlement\n"
     "  5  no answer in time, the helper went away, or its answer was ill-formed\n"
-    "  6  the preference has no value, or the country is not known\n"
+    "  6  there is none: no value, no token, or the country is not known\n"
     "  7  this program itself failed\n";
 
 constexpr std::string_view kGlobalOptions =
@@ -90,8 +90,15 @@ std::span<const Command* const> Commands() {
   static constexpr std::array kCommands{&kListCommand,      &kPreferenceCommand, &kBundleCommand,
                                         &kPathCommand,      &kPlistCommand,      &kFileCommand,
                                         &kCrashLogsCommand, &kLasdCommand,       &kLocationCommand,
+                                        &kVoicemailCommand, &kHeartbeatCommand,  &kRadioLogCommand,
                                         &kCallCommand,      &kStatusCommand,     &kMonitorCommand};
   return kCommands;
+}
+
+ExitCode FinishWithCode(const halvec::Error& error, const GlobalOptions& options) {
+  if (error.failed()) throw RequestFailure(error);
+  if (options.json) Print("{\"code\":0,\"codeName\":\"KERN_SUCCESS\"}\n");
+  return ExitCode::kDone;
 }
 
 halvec::HelperClient Connect(const GlobalOptions& options) {
