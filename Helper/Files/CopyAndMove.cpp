@@ -25,13 +25,12 @@ std::string CrashLogDirectory() {
   return path + "Library/Logs/CrashReporter/";
 }
 
-/// Gives the item itself to the mobile user. Should it have become a link meanwhile, in a folder
-/// where others write, what it points to keeps its owner.
+/// Gives the item to the mobile user.
+/// Kept: as chown(2) does it. A link is followed, so that of a copied link what it points to is
+/// given, and a link to nothing makes it fail.
 bool GiveToMobileUser(const std::string& path) {
-  platform::FileAttributes attributes;
-  attributes.ownerId = GetMobileUserUID();
-  attributes.groupId = GetMobileUserGID();
-  return platform::Shared<platform::FileManager>().setAttributes(attributes, path, nullptr);
+  return SetItemOwner(path.c_str(), GetMobileUserUID(), GetMobileUserGID(),
+                      /*recursive=*/false) == 0;
 }
 
 }  // namespace

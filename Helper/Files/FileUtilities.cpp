@@ -84,9 +84,11 @@ std::int32_t SetAttributesRecursively(const char* path, const FileAttributes& at
   if (kind == FileKind::kDirectory) {
     // Kept: nothing clears the slot, so a failure without an error object of its own counts with
     // the one before it.
-    manager.setAttributesBelow(root, manager.subpaths(root), attributes, &error, [&](bool done) {
-      if (!done && error) last = *error;
-    });
+    FilePlace item(root, "");
+    for (std::string& subpath : manager.subpaths(root)) {
+      item.subpath = std::move(subpath);
+      if (!manager.setAttributes(attributes, item, &error) && error) last = *error;
+    }
   }
   if (!manager.setAttributes(attributes, root, &error) && error) return *error;
   return last;
@@ -157,9 +159,11 @@ void MergeItem(FileManager& manager, const std::string& source, const std::strin
   if (CopyOrMove(manager, source, destination, copy, copy ? &error : nullptr)) return;
   if (manager.kind(source) == FileKind::kOther) return;
   std::optional<std::string> made;
+  FilePlace from(source, "");
+  FilePlace to(destination, "");
   for (const std::string& subpath : manager.subpaths(source)) {
-    const FilePlace from{source, subpath};
-    const FilePlace to{destination, subpath};
+    from.subpath = subpath;
+    to.subpath = subpath;
     if (manager.kind(to) == FileKind::kOther && manager.kind(from) == FileKind::kOther) {
       (void)manager.removeItem(to, nullptr);
     }

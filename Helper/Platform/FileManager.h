@@ -5,7 +5,7 @@
 #pragma once
 
 #include <cstdint>
-#include <functional>
+#include <memory>
 #include <optional>
 #include <string>
 #include <utility>
@@ -20,10 +20,17 @@ namespace platform {
 /// successful one leaves the slot alone, so an old error stays in it.
 using FileError = std::optional<std::int32_t>;
 
+/// What a file manager keeps open for a place.
+struct OpenFolders;
+
 /// Where an item stands. Symbolic links in `path` are followed up to its last component. `subpath`,
 /// relative to the directory `path`, is never led anywhere else by a link above its last component:
 /// such an item cannot be reached (ELOOP). An empty `path` is the path that could not be decoded:
 /// nothing exists there, and every operation on it fails without an error object.
+///
+/// A place that is used for one item of a directory after another, by giving it another `subpath`,
+/// is reached faster than a new one: it remembers, shared with its copies, which folders are open.
+/// One thread uses a place and its copies.
 struct FilePlace {
   FilePlace(std::string whole) : path(std::move(whole)) {}  // NOLINT: a path is a place
   FilePlace(const char* whole) : path(whole) {}             // NOLINT
@@ -32,6 +39,7 @@ struct FilePlace {
 
   std::string path;
   std::string subpath;
+  mutable std::shared_ptr<OpenFolders> opened;  // the file manager's own
 };
 
 enum class FileKind { kAbsent, kDirectory, kOther };
@@ -94,16 +102,6 @@ class FileManager {
   /// permissions to set.
   virtual bool setAttributes(const FileAttributes& attributes, const FilePlace& place,
                              FileError* error) = 0;
-
-  /// setAttributes() for each item below the directory `path`, in the order given; `each` hears
-  /// after every one whether it succeeded. All share one error slot, which nothing clears.
-  virtual void setAttributesBelow(const std::string& path, const std::vector<std::string>& subpaths,
-                                  const FileAttributes& attributes, FileError* error,
-                                  const std::function<void(bool done)>& each) {
-    for (const std::string& subpath : subpaths) {
-      each(setAttributes(attributes, FilePlace(path, subpath), error));
-    }
-  }
 
   /// chown(2): gives an item to a user and a group, a link at the end followed.
   virtual bool changeOwner(const std::string& path, std::uint32_t uid, std::uint32_t gid) = 0;

@@ -28,29 +28,47 @@ FileDescriptor OpenBeneath(int root, const std::string& subpath, int flags) {
       static_cast<int>(::syscall(SYS_openat2, root, subpath.c_str(), &how, sizeof how)));
 }
 
+namespace {
+
+SharedFolder Share(FileDescriptor folder) {
+  return folder ? std::make_shared<const FileDescriptor>(std::move(folder)) : nullptr;
+}
+
+/// Finds the folder of a path, links followed.
+int LocatePath(std::string_view path, FileLocation& location) {
+  while (path.ends_with('/')) path.remove_suffix(1);
+  const std::size_t slash = path.rfind('/');
+  const std::string folder(slash == std::string_view::npos ? (path.empty() ? "/" : ".")
+                                                           : path.substr(0, slash + 1));
+  location.name = slash == std::string_view::npos ? path : path.substr(slash + 1);
+  if (location.name.empty()) location.name = ".";
+  location.holder = Share(FileDescriptor(::open(folder.c_str(), kPathOnly)));
+  return location.holder ? 0 : errno;
+}
+
+/// Finds the folder of what stands below a directory: the one of the last time, as a rule.
+int LocateBelow(const FilePlace& place, OpenFolders& opened, FileLocation& location) {
+  const std::size_t slash = place.subpath.rfind('/');
+  const std::size_t length = slash == std::string::npos ? 0 : slash;
+  location.name.assign(place.subpath, slash == std::string::npos ? 0 : slash + 1);
+  if (!opened.folder || place.subpath.compare(0, length, opened.path) != 0) {
+    if (!opened.root) opened.root = Share(FileDescriptor(::open(place.path.c_str(), kPathOnly)));
+    if (!opened.root) return errno;
+    opened.path.assign(place.subpath, 0, length);
+    opened.folder =
+        length == 0 ? opened.root : Share(OpenBeneath(opened.root->get(), opened.path, kPathOnly));
+  }
+  location.holder = opened.folder;
+  return location.holder ? 0 : errno;
+}
+
+}  // namespace
+
 int Locate(const FilePlace& place, FileLocation& location) {
   if (place.path.empty()) return kNoErrorObject;
-  if (place.subpath.empty()) {
-    std::string_view path = place.path;
-    while (path.ends_with('/')) path.remove_suffix(1);
-    const std::size_t slash = path.rfind('/');
-    const std::string folder(slash == std::string_view::npos ? (path.empty() ? "/" : ".")
-                                                             : path.substr(0, slash + 1));
-    location.name = slash == std::string_view::npos ? path : path.substr(slash + 1);
-    if (location.name.empty()) location.name = ".";
-    location.folder.reset(::open(folder.c_str(), kPathOnly));
-    return location.folder ? 0 : errno;
-  }
-  FileDescriptor root(::open(place.path.c_str(), kPathOnly));
-  if (!root) return errno;
-  const std::size_t slash = place.subpath.rfind('/');
-  if (slash == std::string::npos) {
-    location = {std::move(root), place.subpath};
-    return 0;
-  }
-  location = {OpenBeneath(root.get(), place.subpath.substr(0, slash), kPathOnly),
-              place.subpath.substr(slash + 1)};
-  return location.folder ? 0 : errno;
+  if (place.subpath.empty()) return LocatePath(place.path, location);
+  if (!place.opened) place.opened = std::make_shared<OpenFolders>();
+  return LocateBelow(place, *place.opened, location);
 }
 
 int RenameToFreeName(int fromFolder, const char* from, int toFolder, const char* to) {

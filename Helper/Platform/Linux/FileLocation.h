@@ -22,10 +22,21 @@ inline constexpr int kNoErrorObject = -1;
 /// ENAMETOOLONG before the process runs out of them.
 inline constexpr int kDeepestLevel = 200;
 
+using SharedFolder = std::shared_ptr<const FileDescriptor>;
+
+/// What a place remembers from one item below its path to the next.
+struct OpenFolders {
+  SharedFolder root;
+  std::string path;     // of `folder` below the root
+  SharedFolder folder;  // of the last item; null when it could not be opened
+};
+
 /// An item: the folder that holds it, open, and its name there ("." for the root directory).
 struct FileLocation {
-  FileDescriptor folder;
+  SharedFolder holder;
   std::string name;
+
+  [[nodiscard]] int folder() const { return holder->get(); }
 };
 
 /// Finds the folder of a place. 0, kNoErrorObject for the empty path, or why it cannot be opened.

@@ -127,7 +127,7 @@ class FileManagerPosix final : public FileManager {
     } else {
       FileLocation at;
       if (Locate(place, at) != 0) return FileKind::kAbsent;
-      if (::fstatat(at.folder.get(), at.name.c_str(), &status, 0) != 0) return FileKind::kAbsent;
+      if (::fstatat(at.folder(), at.name.c_str(), &status, 0) != 0) return FileKind::kAbsent;
     }
     return S_ISDIR(status.st_mode) ? FileKind::kDirectory : FileKind::kOther;
   }
@@ -155,7 +155,7 @@ class FileManagerPosix final : public FileManager {
       FileLocation at;
       int code = Locate(place, at);
       if (code == 0) {
-        code = MakeFolder(at.folder.get(), at.name.c_str(), ids, attributes.permissions);
+        code = MakeFolder(at.folder(), at.name.c_str(), ids, attributes.permissions);
       }
       return Answer(code, error);
     }
@@ -192,7 +192,7 @@ class FileManagerPosix final : public FileManager {
     FileLocation at;
     int code = Locate(place, at);
     if (code == 0 && (at.name == "." || at.name == "..")) code = EINVAL;
-    if (code == 0) code = RemoveTree(at.folder.get(), at.name.c_str());
+    if (code == 0) code = RemoveTree(at.folder(), at.name.c_str());
     return Answer(code, error);
   }
 
@@ -204,33 +204,8 @@ class FileManagerPosix final : public FileManager {
     FileLocation at;
     int code = Locate(place, at);
     if (code == 0) code = ResolveIds(attributes, ids);
-    if (code == 0) code = ApplyTo(at.folder.get(), at.name.c_str(), ids, attributes.permissions);
+    if (code == 0) code = ApplyTo(at.folder(), at.name.c_str(), ids, attributes.permissions);
     return Answer(code, error);
-  }
-
-  void setAttributesBelow(const std::string& path, const std::vector<std::string>& subpaths,
-                          const FileAttributes& attributes, FileError* error,
-                          const std::function<void(bool done)>& each) override {
-    Ids ids;
-    const int resolving = path.empty() ? kNoErrorObject : ResolveIds(attributes, ids);
-    // Items of one folder stand together as a rule, so that one opening serves them all.
-    FileLocation at;
-    std::string folder;
-    bool isOpen = false;
-    for (const std::string& subpath : subpaths) {
-      const std::size_t slash = subpath.rfind('/');
-      const std::size_t length = slash == std::string::npos ? 0 : slash + 1;
-      int code = resolving;
-      if (code == 0 && (!isOpen || subpath.compare(0, length, folder) != 0)) {
-        code = Locate({path, subpath}, at);
-        isOpen = code == 0;
-        folder.assign(subpath, 0, length);
-      }
-      if (code == 0) {
-        code = ApplyTo(at.folder.get(), subpath.c_str() + length, ids, attributes.permissions);
-      }
-      each(Answer(code, error));
-    }
   }
 
   bool changeOwner(const std::string& path, std::uint32_t uid, std::uint32_t gid) override {
@@ -240,10 +215,10 @@ class FileManagerPosix final : public FileManager {
  private:
   static int move(const FileLocation& from, const FileLocation& to) {
     const int error =
-        RenameToFreeName(from.folder.get(), from.name.c_str(), to.folder.get(), to.name.c_str());
+        RenameToFreeName(from.folder(), from.name.c_str(), to.folder(), to.name.c_str());
     if (error != EXDEV) return error;
     if (const int copying = CopyTree(from, to, CopyRule::kAllOrNothing)) return copying;
-    return RemoveTree(from.folder.get(), from.name.c_str());
+    return RemoveTree(from.folder(), from.name.c_str());
   }
 };
 

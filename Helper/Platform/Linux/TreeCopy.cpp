@@ -2,18 +2,17 @@
 #include "Helper/Platform/Linux/TreeCopy.h"
 
 #include <fcntl.h>
-#include <sys/random.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <array>
 #include <cerrno>
 #include <climits>
-#include <cstdint>
-#include <cstdio>
 #include <utility>
 
 #include "Helper/Platform/Linux/FileBody.h"
+#include "Helper/Platform/Linux/NewFile.h"
+#include "Helper/Platform/Linux/WorkName.h"
 
 namespace platform {
 namespace {
@@ -32,24 +31,42 @@ int CopyLink(int fromFolder, const char* from, int toFolder, const char* to,
   return 0;
 }
 
-/// One copy: remembers its rule and its first failure.
+int OpenSource(int folder, const char* name, FileDescriptor& source, struct stat& status) {
+  // Should the name be a FIFO by now, opening it does not wait, and it is given up at once.
+  source.reset(::openat(folder, name, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+  if (!source || ::fstat(source.get(), &status) != 0) return errno;
+  return S_ISREG(status.st_mode) ? 0 : EOPNOTSUPP;
+}
+
+int CopyContent(int from, int to, const struct stat& status) {
+  const int error = CopyFileBytes(from, to, status);
+  return error != 0 ? error : CopyFileAttributes(from, to, status);
+}
+
+/// Copies a file that stands alone to a name that must be free.
+int CopyLoneFile(int fromFolder, const char* from, int toFolder, const char* to) {
+  FileDescriptor source;
+  NewFile target;
+  struct stat status {};
+  int error = OpenSource(fromFolder, from, source, status);
+  if (error == 0) error = target.make(toFolder);
+  if (error == 0) error = CopyContent(source.get(), target.descriptor(), status);
+  return error != 0 ? error : target.giveName(to, IfTaken::kFail);
+}
+
+/// The copy of one tree: remembers its rule and its first failure.
 class TreeCopy {
  public:
   explicit TreeCopy(CopyRule rule) : rule_(rule) {}
 
-  /// Copies one item to a free name.
-  void copyItem(int fromFolder, const char* from, int toFolder, const char* to, int level) {
+  /// Copies a folder's content and attributes into `top`, which is new.
+  void copyTop(int fromFolder, const char* from, int top) {
+    FileDescriptor source = OpenFolder(fromFolder, from);
     struct stat status {};
-    if (::fstatat(fromFolder, from, &status, AT_SYMLINK_NOFOLLOW) != 0) return fail(errno);
-    if (S_ISREG(status.st_mode)) {
-      fail(copyFile(fromFolder, from, toFolder, to));
-    } else if (S_ISDIR(status.st_mode)) {
-      copyFolder(fromFolder, from, toFolder, to, level);
-    } else if (S_ISLNK(status.st_mode)) {
-      fail(CopyLink(fromFolder, from, toFolder, to, status));
-    } else {
-      fail(EOPNOTSUPP);
+    if (!source || ::fstat(source.get(), &status) != 0 || ::fstat(top, &top_) != 0) {
+      return fail(errno);
     }
+    copyFolder(std::move(source), status, top, 0);
   }
 
   [[nodiscard]] int firstError() const { return first_; }
@@ -64,40 +81,57 @@ class TreeCopy {
     lost_ = lost_ || EndsEveryWrite(error);
   }
 
-  static int copyFile(int fromFolder, const char* from, int toFolder, const char* to) {
-    // Should the name be a FIFO by now, opening it does not wait, and it is given up at once.
-    const FileDescriptor source(
-        ::openat(fromFolder, from, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+  /// Copies one item to its own name in a folder that is new. `type` is the directory entry's.
+  void copyItem(int fromFolder, const char* name, unsigned char type, int toFolder, int level) {
+    if (type == DT_REG) return fail(copyFile(fromFolder, name, toFolder));
     struct stat status {};
-    if (!source || ::fstat(source.get(), &status) != 0) return errno;
-    if (!S_ISREG(status.st_mode)) return EOPNOTSUPP;
+    if (::fstatat(fromFolder, name, &status, AT_SYMLINK_NOFOLLOW) != 0) return fail(errno);
+    if (S_ISREG(status.st_mode)) {
+      fail(copyFile(fromFolder, name, toFolder));
+    } else if (S_ISDIR(status.st_mode)) {
+      makeFolder(fromFolder, name, toFolder, level);
+    } else if (S_ISLNK(status.st_mode)) {
+      fail(CopyLink(fromFolder, name, toFolder, name, status));
+    } else {
+      fail(EOPNOTSUPP);
+    }
+  }
+
+  static int copyFile(int fromFolder, const char* name, int toFolder) {
+    FileDescriptor source;
+    struct stat status {};
+    if (const int error = OpenSource(fromFolder, name, source, status)) return error;
     const FileDescriptor target(
-        ::openat(toFolder, to, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
+        ::openat(toFolder, name, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
     if (!target) return errno;
-    int error = CopyFileBytes(source.get(), target.get(), status);
-    if (error == 0) error = CopyFileAttributes(source.get(), target.get(), status);
-    if (error != 0) ::unlinkat(toFolder, to, 0);
+    const int error = CopyContent(source.get(), target.get(), status);
+    if (error != 0) ::unlinkat(toFolder, name, 0);
     return error;
   }
 
-  void copyFolder(int fromFolder, const char* from, int toFolder, const char* to, int level) {
+  void makeFolder(int fromFolder, const char* name, int toFolder, int level) {
     if (level >= kDeepestLevel) return fail(ENAMETOOLONG);
-    FolderReader source(OpenFolder(fromFolder, from));
+    FileDescriptor source = OpenFolder(fromFolder, name);
     struct stat status {};
-    if (!source || ::fstat(source.descriptor(), &status) != 0) return fail(errno);
+    if (!source || ::fstat(source.get(), &status) != 0) return fail(errno);
     // A mount can lead into the copy itself on ways that the folders above it do not show.
     if (status.st_dev == top_.st_dev && status.st_ino == top_.st_ino) return fail(EINVAL);
-    if (::mkdirat(toFolder, to, 0700) != 0) return fail(errno);
-    const FileDescriptor target = OpenFolder(toFolder, to);
+    if (::mkdirat(toFolder, name, 0700) != 0) return fail(errno);
+    const FileDescriptor target = OpenFolder(toFolder, name);
     if (!target) return fail(errno);
-    if (level == 0 && ::fstat(target.get(), &top_) != 0) return fail(errno);
+    copyFolder(std::move(source), status, target.get(), level);
+  }
+
+  void copyFolder(FileDescriptor from, const struct stat& status, int to, int level) {
+    FolderReader source(std::move(from));
+    if (!source) return fail(errno);
     while (!isLost()) {
       const dirent* entry = source.next();
       if (!entry) break;
-      copyItem(source.descriptor(), entry->d_name, target.get(), entry->d_name, level + 1);
+      copyItem(source.descriptor(), entry->d_name, entry->d_type, to, level + 1);
     }
     fail(source.error());
-    if (!isLost()) fail(CopyFileAttributes(source.descriptor(), target.get(), status));
+    if (!isLost()) fail(CopyFileAttributes(source.descriptor(), to, status));
   }
 
   const CopyRule rule_;
@@ -106,40 +140,38 @@ class TreeCopy {
   struct stat top_ {};
 };
 
-std::string FreeName() {
-  std::uint64_t number = 0;
-  // Should there be no randomness yet, the exclusive creation still protects what is there.
-  (void)!::getrandom(&number, sizeof number, GRND_NONBLOCK);
-  std::array<char, 32> name;
-  std::snprintf(name.data(), name.size(), ".copy-%016llx", static_cast<unsigned long long>(number));
-  return name.data();
+/// Copies a folder with everything below it to a name that must be free.
+int CopyWholeTree(int fromFolder, const char* from, int toFolder, const char* to, CopyRule rule) {
+  WorkItem work;
+  if (const int error = MakeWorkItem(toFolder, WorkKind::kFolder, work)) return error;
+  TreeCopy copy(rule);
+  copy.copyTop(fromFolder, from, work.item.get());
+  int error = copy.firstError();
+  if (!copy.isLost()) {
+    const int renaming = RenameToFreeName(toFolder, work.name.c_str(), toFolder, to);
+    if (renaming == 0) return error;
+    if (error == 0) error = renaming;
+  }
+  (void)RemoveTree(toFolder, work.name.c_str());  // the failure is the answer, not the tidying
+  return error;
 }
 
 }  // namespace
 
 int CopyTree(const FileLocation& source, const FileLocation& destination, CopyRule rule) {
   struct stat status {};
-  const int folder = destination.folder.get();
-  const char* name = destination.name.c_str();
-  if (::fstatat(source.folder.get(), source.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
-    return errno;
-  }
   struct stat existing {};
-  if (::fstatat(folder, name, &existing, AT_SYMLINK_NOFOLLOW) == 0) return EEXIST;
-  if (S_ISDIR(status.st_mode) && IsWithin(folder, status)) return EINVAL;
-  TreeCopy copy(rule);
-  const std::string temporary = FreeName();
-  copy.copyItem(source.folder.get(), source.name.c_str(), folder, temporary.c_str(), 0);
-  // A lone item that failed is not there, and renaming it would only hide why.
-  int error = copy.firstError();
-  const bool publish = !copy.isLost() && (error == 0 || S_ISDIR(status.st_mode));
-  if (publish) {
-    const int renaming = RenameToFreeName(folder, temporary.c_str(), folder, name);
-    if (renaming == 0) return error;
-    if (error == 0) error = renaming;
-  }
-  (void)RemoveTree(folder, temporary.c_str());  // the failure is the answer, not the tidying
-  return error;
+  const int fromFolder = source.folder();
+  const int toFolder = destination.folder();
+  const char* from = source.name.c_str();
+  const char* to = destination.name.c_str();
+  if (::fstatat(fromFolder, from, &status, AT_SYMLINK_NOFOLLOW) != 0) return errno;
+  if (::fstatat(toFolder, to, &existing, AT_SYMLINK_NOFOLLOW) == 0) return EEXIST;
+  if (S_ISREG(status.st_mode)) return CopyLoneFile(fromFolder, from, toFolder, to);
+  if (S_ISLNK(status.st_mode)) return CopyLink(fromFolder, from, toFolder, to, status);
+  if (!S_ISDIR(status.st_mode)) return EOPNOTSUPP;
+  if (IsWithin(toFolder, status)) return EINVAL;
+  return CopyWholeTree(fromFolder, from, toFolder, to, rule);
 }
 
 }  // namespace platform

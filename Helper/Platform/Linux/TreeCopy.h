@@ -13,9 +13,9 @@ enum class CopyRule {
   kAllOrNothing    // any failure leaves the destination as it was
 };
 
-/// Copies as FileManager::copyItem() promises. The item takes shape under a name of its own in the
-/// destination's folder, ".copy-" and sixteen hexadecimal digits, and gets its final name last; a
-/// process that is killed meanwhile leaves that name behind. An error number, or 0.
+/// Copies as FileManager::copyItem() promises. A file takes shape without a name where the file
+/// system can do that, a tree under a work name in the destination's folder (WorkName.h); both get
+/// their final name last. An error number, or 0.
 [[nodiscard]] int CopyTree(const FileLocation& source, const FileLocation& destination,
                            CopyRule rule);
 
