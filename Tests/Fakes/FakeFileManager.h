@@ -124,7 +124,7 @@ class FakeFileManager final : public platform::FileManager {
   }
   bool changeOwner(const std::string& path, std::uint32_t uid, std::uint32_t gid) override {
     Node* node = follow(path);
-    if (!node) return false;
+    if (!node || faults.contains(path)) return false;
     node->uid = uid;
     node->gid = gid;
     return true;

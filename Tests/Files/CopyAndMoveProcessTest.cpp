@@ -43,14 +43,23 @@ TEST_F(CopyFile, OutsideEveryAllowedPlaceTouchesNothing) {
       << outcome.output;
 }
 
-TEST_F(CopyFile, ThatIsALinkGivesTheLinkToTheMobileUserAndNotTheFileBehindIt) {
+TEST_F(CopyFile, ThatIsALinkGivesTheFileBehindItToTheMobileUserAndNotTheLink) {
   const Outcome outcome =
       run(kHome +
-          "mkdir /tmp/s; echo secret >/tmp/secret; chmod 600 /tmp/secret; ln -s /tmp/secret "
-          "/tmp/s/f\n"
-          "halvecctl call CopyFile /tmp/s '/var/mobile/Library/Carrier Bundles' f >/dev/null\n"
-          "echo $?; stat -c '%F %U' '/var/mobile/Library/Carrier Bundles/f' /tmp/secret");
-  EXPECT_EQ(outcome.output, "0\nsymbolic link mobile\nregular file root\n") << outcome.errors;
+          "mkdir /tmp/s; echo text >/tmp/behind; ln -s /tmp/behind /tmp/s/f\n"
+          "ln -s /none /tmp/s/dangling\n"
+          "for name in f dangling; do halvecctl call CopyFile /tmp/s "
+          "'/var/mobile/Library/Carrier Bundles' $name >/dev/null 2>&1; echo $?; done\n"
+          "stat -c '%F %U' '/var/mobile/Library/Carrier Bundles/f' /tmp/behind");
+  EXPECT_EQ(outcome.output, "0\n1\nsymbolic link root\nregular file mobile\n") << outcome.errors;
+}
+
+TEST_F(CopyFile, LeavesNothingOfAKillWhenTheNextCopyIsDone) {
+  const Outcome outcome =
+      run(kHome +
+          "mkdir -p /tmp/s Library/Logs/CrashReporter/.halvec-copy-0/half\n"
+          "echo a >/tmp/s/f; halvecctl crash-logs copy /tmp/s; ls -A Library/Logs/CrashReporter");
+  EXPECT_EQ(outcome.output, "s\n") << outcome.errors;
 }
 
 TEST_F(CopyFile, ThatIsAFifoFailsAtOnceAndTheHelperServesOn) {

@@ -118,12 +118,19 @@ TEST_F(CopyAndMove, GiveTheDirectoryToTheMobileUserWhenTheFileLandsInIt) {
   EXPECT_EQ(files.contentOf(bundles + "/file/file"), "text");
 }
 
-TEST_F(CopyAndMove, GiveALinkItselfToTheMobileUserAndNotWhatItPointsTo) {
-  files.addDirectory("/etc");
-  files.nodes["/etc"].uid = 99;
-  files.addLink(bundles + "/file", "/etc");
-  EXPECT_EQ(send(kCopyFile, {"/source", bundles, "file"}), 1U);
-  EXPECT_EQ(files.nodes["/etc"].uid, 99U);
+TEST_F(CopyAndMove, GiveWhatALinkPointsToToTheMobileUser) {
+  files.addFile("/elsewhere", "text");
+  files.nodes["/elsewhere"].uid = 99;
+  files.addLink("/source/link", "/elsewhere");
+  EXPECT_EQ(send(kCopyFile, {"/source", bundles, "link"}), 1U);
+  EXPECT_EQ(files.nodes["/elsewhere"].uid, GetMobileUserUID());
+}
+
+TEST_F(CopyAndMove, KeepALinkToNothingButFailWithoutALine) {
+  files.addLink("/source/link", "/elsewhere");
+  files.addFile("/elsewhere", "text");
+  (void)files.removeItem("/elsewhere", nullptr);
+  EXPECT_EQ(send(kCopyFile, {"/source", bundles, "link"}), 0U);
 }
 
 TEST_F(CopyAndMove, ReadAFieldWithoutItsZeroAs255Bytes) {

@@ -247,22 +247,29 @@ TYPED_TEST(FileManagerContract, SetsPermissionsOfAnItemBelowADirectory) {
   EXPECT_EQ(error, ENOENT);
 }
 
-TYPED_TEST(FileManagerContract, SetsAttributesBelowADirectoryOneAfterTheOtherInOneSlot) {
+TYPED_TEST(FileManagerContract, TakesOnePlaceForOneItemOfADirectoryAfterAnother) {
   this->files.folder("tree");
   this->files.folder("tree/sub");
   for (const char* name : {"tree/a", "tree/sub/b", "tree/c"}) this->files.file(name, "");
   platform::FileAttributes attributes;
   attributes.permissions = 0604;
-  std::vector<bool> heard;
+  platform::FilePlace place(this->files.at("tree"), "");
+  std::vector<bool> done;
   FileError error;
-  this->manager().setAttributesBelow(this->files.at("tree"),
-                                     {"a", "none", "sub/b", "none/d", "sub/none", "c"}, attributes,
-                                     &error, [&](bool done) { heard.push_back(done); });
-  EXPECT_EQ(heard, (std::vector<bool>{true, false, true, false, false, true}));
+  for (const char* name : {"a", "none", "sub/b", "none/d", "sub/none", "c"}) {
+    place.subpath = name;
+    done.push_back(this->manager().setAttributes(attributes, place, &error));
+  }
+  EXPECT_EQ(done, (std::vector<bool>{true, false, true, false, false, true}));
   EXPECT_EQ(error, ENOENT) << "a success does not clear the slot";
   for (const char* name : {"tree/a", "tree/sub/b", "tree/c"}) {
     EXPECT_EQ(this->files.permissions(name), 0604U) << name;
   }
+  EXPECT_TRUE(this->manager().createDirectory({this->files.at("tree"), "none"}, true, {}, nullptr));
+  place.subpath = "none/d";
+  EXPECT_EQ(this->manager().kind(place), FileKind::kAbsent);
+  EXPECT_TRUE(this->manager().copyItem(this->files.at("tree/a"), place, nullptr))
+      << "a folder that was not there before is found once it is";
 }
 
 }  // namespace
