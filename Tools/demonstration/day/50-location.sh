@@ -25,15 +25,15 @@ until grep -q '^TracerPid:.[1-9]' "/proc/$helper/status"; do :; done
 locate 47.3769 8.5417
 handset log --skip "$lines" --follow-until "wasn't waiting" --timeout 20
 kill $tracer
-wait $tracer || true
+wait $tracer 2>/dev/null || true
 
-say "In time: Zurich, Hong Kong, San Juan of Puerto Rico, Monaco, a village in Kenya, Fiji."
+say "In time: Zurich, Hong Kong, San Juan of Puerto Rico, Monaco, Malindi in Kenya, Suva in Fiji."
 locate 47.3769 8.5417
 locate 22.2819 114.1582
 locate 18.4655 -66.1057
 locate 43.7384 7.4246
-locate -3.2236 40.1300
-locate -17.7134 178.0650
+locate -3.2192 40.1169
+locate -18.1416 178.4419
 
 say "In the open sea, and at (0, 0), which means that nobody knows, it is the country alone."
 locate -48.8767 -123.3933
