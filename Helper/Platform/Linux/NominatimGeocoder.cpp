@@ -124,7 +124,8 @@ GeocodeAnswer NominatimGeocoder::lookUp(const Coordinate& place) {
   const auto arrival = std::make_shared<std::promise<Response>>();
   std::future<Response> response = arrival->get_future();
   request->setCallbackQueue(AnswerQueue());
-  request->setCompletionCallback([arrival](Response answer) { arrival->set_value(answer); });
+  request->setCompletionCallback(
+      [arrival](Response answer) { arrival->set_value(std::move(answer)); });
   request->start("");
   if (response.wait_for(limit_) != std::future_status::ready) {
     return GeocodeError{"the geocoder did not answer in time"};
