@@ -186,6 +186,48 @@ TEST_F(Location, LeavesNoDescriptorBehind) {
   EXPECT_TRUE(outcome.output.ends_with("\n0\n")) << outcome.output << outcome.errors;
 }
 
+/// The same program with an endpoint, and in the world beyond the handset the server that it names.
+class OnlineLocation : public ProcessSuite {
+ protected:
+  static Outcome runOnline(const std::string& script) {
+    const handset_tests::TemporaryFolder web;
+    return run(
+        "handset web stop; mkfifo /tmp/input /tmp/output\n"
+        "handset world -- python3 -B /mnt/geocoder_server.py /run/handset/web-certificate.pem "
+        "/run/handset/web-key.pem 198.51.100.1 443 </tmp/input >/tmp/output &\n"
+        "exec 3>/tmp/input 4</tmp/output; read port <&4\n" +
+            script,
+        {"--bind", ATLAS ":" HALVEC_ATLAS_FILE, "--helper", ONLINE_HELPER, "--web", web.path(),
+         "--web-host", "geocoder.example", "--bind", LOCATION_TEST_SCRIPTS ":/mnt"});
+  }
+};
+
+TEST_F(OnlineLocation, HasStateCityAndPostCodeOfTheServiceInTheAtlassCountry) {
+  const Outcome outcome =
+      runOnline("halvecctl location resolve 47.376888 8.541694\n" + Delivered(2));
+  EXPECT_EQ(outcome.output,
+            kConnect + Civic("country=\"CH\" state=\"Z\xc3\xbcrich\" city=\"47.3769 8.5417\" "
+                             "postalCode=\"HalvecMobileHelper/" HALVEC_VERSION "\""))
+      << outcome.errors;
+}
+
+TEST_F(OnlineLocation, KeepsTheAtlassAnswerWhereTheServiceNamesAnotherCountry) {
+  const Outcome outcome = runOnline("halvecctl location resolve 48.8566 2.3522\n" + Delivered(2));
+  EXPECT_EQ(outcome.output,
+            kConnect + Civic("country=\"FR\" state=\"\xc3\x8ele-de-France\" city=\"Paris\" "
+                             "postalCode=\"\""))
+      << outcome.errors;
+}
+
+TEST_F(OnlineLocation, IsTheAtlassAnswerInTimeWhenTheServiceIsSilent) {
+  const Outcome outcome = runOnline("halvecctl location resolve -- 4.711 -74.0721\n" +
+                                    Delivered(2) + "handset log | grep -c 'waiting'");
+  EXPECT_TRUE(outcome.output.starts_with(kConnect + "com.zarvo.Halvec.connection  civic "
+                                                    "country=\"CO\" state=\"Bogota D.C.\" "))
+      << outcome.output << outcome.errors;
+  EXPECT_TRUE(outcome.output.ends_with("\n0\n")) << outcome.output;
+}
+
 using Country = ProcessSuite;
 
 TEST_F(Country, IsThatOfTheTimeZoneUntilAnotherIsChosen) {

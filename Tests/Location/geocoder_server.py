@@ -1,8 +1,8 @@
 #!/usr/bin/env python3
 # SPDX-License-Identifier: Apache-2.0
-"""geocoder_server.py CERTIFICATE: an https geocoder for tests.
+"""geocoder_server.py CERTIFICATE [KEY ADDRESS PORT]: an https geocoder for tests.
 
-Prints its port and an empty line, and serves until standard input ends. It answers only what is
+Serves on a free port of this machine unless it is told where. Prints its port and an empty line, and serves until standard input ends. It answers only what is
 asked exactly as a reverse look-up should be; the whole degrees of latitude say how.
 """
 import http.server
@@ -63,9 +63,10 @@ class Server(http.server.ThreadingHTTPServer):
 
 
 def main():
-    server = Server(("127.0.0.1", 0), Geocoder)
+    key, address, port = sys.argv[2:5] if len(sys.argv) > 2 else (None, "127.0.0.1", 0)
+    server = Server((address, int(port)), Geocoder)
     context = ssl.SSLContext(ssl.PROTOCOL_TLS_SERVER)
-    context.load_cert_chain(sys.argv[1])
+    context.load_cert_chain(sys.argv[1], key)
     server.socket = context.wrap_socket(server.socket, server_side=True,
                                         do_handshake_on_connect=False)
     threading.Thread(target=server.serve_forever, daemon=True).start()
