@@ -81,7 +81,7 @@ TEST_F(Heartbeat, SurvivesTheInterfaceGoingInMidExchangeAndUsesItsSuccessor) {
   const Outcome outcome = run(
       "handset tower reply off; handset capture start pdp_ip0\n"
       "halvecctl heartbeat start\n"
-      "handset capture show pdp_ip0 --count 1 --timeout 30 >/dev/null\n"
+      "handset capture show --count 1 --timeout 30 pdp_ip0 >/dev/null\n"
       "handset network remove pdp_ip0; client connect\n"
       "handset network add pdp_ip0; handset tower reply on\n"
       "handset capture show --protocol icmp --timeout 0 >/tmp/before\n"
