@@ -4,9 +4,9 @@
 // the city that attracts the place most. Any thread; no state.
 #include "Helper/Platform/Linux/Atlas.h"
 
-#include <cmath>
 #include <limits>
-#include <numbers>
+
+#include "Helper/Platform/Linux/AtlasGeometry.h"
 
 namespace platform {
 namespace {
@@ -60,7 +60,7 @@ std::optional<std::uint16_t> Atlas::stateAt(const Coordinate& place, std::uint16
   auto leaf = states_.leafAt(place);
   if (!leaf) return std::nullopt;
   // A cell is twice as many degrees wide as high.
-  const double xScale = 2 * std::cos(place.latitude * std::numbers::pi / 180);
+  const double xScale = 2 * CosineOfDegrees(place.latitude);
   double nearest = std::numeric_limits<double>::infinity();
   std::uint16_t found = 0;
   while (const auto entry = leaf->next()) {

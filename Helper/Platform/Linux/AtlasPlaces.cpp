@@ -6,7 +6,8 @@
 
 #include <algorithm>
 #include <cmath>
-#include <numbers>
+
+#include "Helper/Platform/Linux/AtlasGeometry.h"
 
 namespace platform {
 namespace {
@@ -18,8 +19,8 @@ constexpr double kKilometresPerDegree = 111.2;
 constexpr double kUnitsPerDegree = 1e5;
 
 std::uint32_t Row(double latitude) {
-  const double row = std::floor((latitude + 90) * kCellsPerDegree);
-  return static_cast<std::uint32_t>(std::clamp(row, 0.0, kRows - 1.0));
+  const std::int64_t row = Floor((latitude + 90) * kCellsPerDegree);
+  return static_cast<std::uint32_t>(std::clamp<std::int64_t>(row, 0, kRows - 1));
 }
 
 }  // namespace
@@ -29,8 +30,7 @@ AtlasPlaces::Window AtlasPlaces::windowAround(const Coordinate& center, double r
   const double degrees = reach / kKilometresPerDegree;
   window.firstRow = Row(center.latitude - degrees);
   window.lastRow = Row(center.latitude + degrees);
-  window.kilometresPerDegreeEast =
-      kKilometresPerDegree * std::cos(center.latitude * std::numbers::pi / 180);
+  window.kilometresPerDegreeEast = kKilometresPerDegree * CosineOfDegrees(center.latitude);
   const double degreesEast = reach / window.kilometresPerDegreeEast;
   const double west = (center.longitude - degreesEast + 180) * kCellsPerDegree;
   const double east = (center.longitude + degreesEast + 180) * kCellsPerDegree;
@@ -39,8 +39,8 @@ AtlasPlaces::Window AtlasPlaces::windowAround(const Coordinate& center, double r
     window.columns[0] = {0, kColumns};
     return window;
   }
-  const auto first = static_cast<std::int64_t>(std::floor(west));
-  const auto last = static_cast<std::int64_t>(std::floor(east));
+  const auto first = Floor(west);
+  const auto last = Floor(east);
   const auto column = [](std::int64_t index) {
     return static_cast<std::uint32_t>((index + kColumns) % kColumns);
   };
