@@ -21,9 +21,12 @@
 
 #include <cerrno>
 #include <filesystem>
+#include <fstream>
 #include <functional>
 #include <string>
 #include <thread>
+
+#include "Helper/Platform/Linux/FileLocation.h"
 
 namespace platform {
 namespace {
@@ -155,10 +158,34 @@ TEST_F(Confinement, StillOpensLibraries) {
   EXPECT_EQ(Confined([] { return ::dlopen("libcurl.so.4", RTLD_NOW) ? 0 : 1; }), 0);
 }
 
+TEST_F(Confinement, StillFindsWhatIsBelowAFolderAndNothingBehindALink) {
+  std::filesystem::create_directories(file("tree/inner"));
+  std::filesystem::create_directory_symlink("inner", file("tree/link"));
+  std::ofstream(file("tree/inner/leaf")) << "text";
+  const auto open = [this](const char* subpath, int flags) {
+    return Confined([&, this] {
+      const FileDescriptor tree(::open(file("tree").c_str(), O_PATH | O_DIRECTORY));
+      return OpenBeneath(tree.get(), subpath, flags) ? 0 : errno;
+    });
+  };
+  EXPECT_EQ(open("inner", O_PATH | O_DIRECTORY), 0);
+  EXPECT_EQ(open("inner/leaf", O_RDONLY), 0);
+  EXPECT_EQ(open("inner//leaf", O_PATH), 0);
+  EXPECT_EQ(open(".", O_PATH | O_DIRECTORY), 0);
+  EXPECT_EQ(open("link", O_PATH), ELOOP);
+  EXPECT_EQ(open("link", O_PATH | O_DIRECTORY), ELOOP);
+  EXPECT_EQ(open("link/leaf", O_RDONLY), ELOOP);
+  EXPECT_EQ(open("inner/../inner", O_PATH), EXDEV);
+  EXPECT_EQ(open("/etc", O_PATH), EXDEV);
+  EXPECT_EQ(open("inner/leaf/more", O_PATH), ENOTDIR);
+  EXPECT_EQ(open("absent", O_PATH), ENOENT);
+}
+
 TEST_F(Confinement, AnswersACallThatIsYoungerThanItAsAnOlderKernelWould) {
   constexpr long kNotYet = 480;
   EXPECT_EQ(Confined([] { return ErrorOf(::syscall(kNotYet)); }), ENOSYS);
   EXPECT_EQ(Confined([] { return ErrorOf(::syscall(SYS_clone3, nullptr, 0)); }), ENOSYS);
+  EXPECT_EQ(Confined([] { return ErrorOf(::syscall(SYS_openat2, 0, "", nullptr, 0)); }), ENOSYS);
 }
 
 TEST_F(Confinement, CanBeAskedForTwice) {

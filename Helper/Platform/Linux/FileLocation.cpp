@@ -7,6 +7,7 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdint>
 #include <cstdio>
@@ -18,14 +19,51 @@ namespace {
 
 constexpr int kPathOnly = O_PATH | O_DIRECTORY | O_CLOEXEC;
 
+bool IsLink(int folder, const char* name) {
+  struct stat status {};
+  return ::fstatat(folder, name, &status, AT_SYMLINK_NOFOLLOW | AT_EMPTY_PATH) == 0 &&
+         S_ISLNK(status.st_mode);
+}
+
+/// Opens one item of a folder, which must not be a link.
+FileDescriptor OpenItem(int folder, const char* name, int flags) {
+  FileDescriptor item(::openat(folder, name, flags | O_NOFOLLOW | O_CLOEXEC));
+  const int error = errno;
+  // A link that is opened for its path alone, or as a folder, is not called one by the kernel.
+  const bool isLink = item ? IsLink(item.get(), "") : error == ENOTDIR && IsLink(folder, name);
+  errno = isLink ? ELOOP : error;
+  return isLink ? FileDescriptor() : std::move(item);
+}
+
+/// What the kernel's own walk does, step by step.
+FileDescriptor WalkBeneath(int root, std::string_view subpath, int flags) {
+  FileDescriptor at;
+  while (true) {
+    const std::size_t end = std::min(subpath.find('/'), subpath.size());
+    const std::string name(subpath.substr(0, end));
+    if (name == ".." || subpath.starts_with('/')) {
+      errno = EXDEV;
+      return {};
+    }
+    const bool last = end == subpath.size();
+    FileDescriptor next = OpenItem(at ? at.get() : root, name.c_str(), last ? flags : kPathOnly);
+    if (last || !next) return next;
+    at = std::move(next);
+    subpath.remove_prefix(std::min(subpath.find_first_not_of('/', end), subpath.size()));
+  }
+}
+
 }  // namespace
 
 FileDescriptor OpenBeneath(int root, const std::string& subpath, int flags) {
   open_how how{};
   how.flags = static_cast<std::uint64_t>(flags | O_CLOEXEC);
   how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS | RESOLVE_NO_MAGICLINKS;
-  return FileDescriptor(
+  FileDescriptor found(
       static_cast<int>(::syscall(SYS_openat2, root, subpath.c_str(), &how, sizeof how)));
+  // Filters of system calls hide this one, because they cannot see the mode that it is given.
+  if (!found && errno == ENOSYS) return WalkBeneath(root, subpath, flags);
+  return found;
 }
 
 namespace {

@@ -183,8 +183,10 @@ constexpr Program Build() {
   Jump(program, BPF_JEQ, kArchitecture, 1, 0);
   Return(program, SECCOMP_RET_KILL_PROCESS);
   Load(program, offsetof(seccomp_data, nr));
-  // Its flags stand in memory, where no filter can see them; the C library then uses clone.
-  Jump(program, BPF_JEQ, SYS_clone3, 1, 0);
+  // What these are asked for stands in memory, where no filter can see it; who needs them falls
+  // back to their older forms.
+  Jump(program, BPF_JEQ, SYS_clone3, 2, 0);
+  Jump(program, BPF_JEQ, SYS_openat2, 1, 0);
   Jump(program, BPF_JGT, kYoungest, 0, 1);
   Return(program, kUnknown);
   for (std::span<const Entry> left(kEntries); !left.empty();) {
