@@ -46,6 +46,8 @@ foreach(directory IN LISTS HALVEC_ENTITLEMENT_LIST)
   install(DIRECTORY DESTINATION ${directory} COMPONENT helper)
 endforeach()
 
+halvec_install_documents(helper halvec-mobile-helper.8 halvec-entitlements.5)
+
 # The client library, for who runs with it and for who builds with it.
 install(TARGETS HelperClientShared
         LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT client
@@ -83,6 +85,8 @@ install(FILES ${PROJECT_BINARY_DIR}/Packaging/HalvecMobileHelperConfig.cmake
               ${PROJECT_BINARY_DIR}/Packaging/HalvecMobileHelperConfigVersion.cmake
         DESTINATION ${HALVEC_CONFIG_DIRECTORY} COMPONENT client-development)
 
+halvec_install_documents(client-development halvec-transport.7)
+
 # The command line, entitled where root runs it, and the simulated handset.
 install(TARGETS halvecctl DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT halvecctl)
 halvec_install_configured(halvecctl.plist ${HALVEC_SHARED_ENTITLEMENTS} halvecctl)
@@ -91,3 +95,5 @@ foreach(tool IN ITEMS halvecctl handset)
   install(FILES Packaging/completion/${tool}
           DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions COMPONENT ${tool})
 endforeach()
+halvec_install_documents(halvecctl halvecctl.1)
+halvec_install_documents(handset handset.1)
