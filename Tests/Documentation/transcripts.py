@@ -4,9 +4,10 @@
 
 A fenced block marked `console` is a transcript: a line that begins with "$ " is a command, what
 follows is its output. In a manual page the same stands after ".Dl $ ". All transcripts of a document
-run in order in one simulated handset, in one shell, with halvecctl entitled for root. Each command
-must end with 0, or with what a comment "# exits N" behind it says, and print every line that the
-document shows, numbers apart: a number stands for any number, and "..." for anything.
+run in order in one simulated handset, in one shell, with halvecctl entitled for root unless the
+document does that itself. Each command must end with 0, or with what a comment "# exits N" behind it
+says, and print every line that the document shows, numbers apart: a number stands for any number,
+and "..." for anything.
 """
 import argparse
 import pathlib
@@ -61,7 +62,9 @@ def failures(step, status, output):
 
 
 def script_of(steps):
-    lines = ["handset entitle /usr/libexec/halvec/halvecctl root >/dev/null", "exec 2>&1"]
+    lines = ["exec 2>&1"]
+    if not any("handset entitle" in step.command for step in steps):
+        lines.append("handset entitle /usr/libexec/halvec/halvecctl root >/dev/null")
     for step in steps:
         lines += [step.command, f'status=$?; echo; echo "{MARK}$status"']
     return "\n".join(lines)
