@@ -92,7 +92,8 @@ TEST_F(HandsetWeb, StopsAndStartsItsServer) {
 
 TEST_F(HandsetWeb, SaysWhenItsServerDies) {
   const Outcome outcome = run("ask-web get https://" MANIFEST_HOST
-                              "/other; kill -KILL $(cat /run/handset/nginx.pid)\n"
+                              "/other; server=$(cat /run/handset/nginx.pid)\n"
+                              "kill -KILL $server; while kill -0 $server 2>/dev/null; do :; done\n"
                               "handset web stop; echo $?");
   EXPECT_EQ(outcome.output, "200 application/octet-stream None 10\n1\n");
   EXPECT_EQ(outcome.errors,
