@@ -23,8 +23,9 @@ show handset status
 
 say "halvecctl is let in, because root has listed it; so is every program that root lists."
 show handset entitle $tools/halvecctl root
+await_watcher
 
-say "The first message starts the helper. Every value of a carrier file goes through it."
+say "Every value of a carrier file goes through it."
 for key in $(keys); do
   value_of "$key" | $tools/halvecctl preference set $domain "$key" --plist -
   echo "set $key"

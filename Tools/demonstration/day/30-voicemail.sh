@@ -12,6 +12,7 @@ say "The helper is killed in the midst of it. What it acknowledged is on the dis
 show handset kill KILL
 show handset wait-exit --timeout 20
 show $tools/halvecctl voicemail token get
+await_watcher
 
 say "The store is closed to everybody but the helper."
 show ls -l $store
