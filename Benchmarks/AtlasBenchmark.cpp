@@ -134,6 +134,11 @@ double MegabytesOf(const std::string& path) {
 }
 
 void Measure(const std::string& path, const std::string& databasePath, bench::Report& report) {
+  const Coordinate vienna{48.2082, 16.3738};
+  // First: what is mapped cannot be evicted.
+  const double opening = ColdOpening(path, [&] { (void)Open(path); });
+  const double answering =
+      ColdOpening(path, [&] { (void)platform::AtlasGeocoder(path).lookUp(vienna); });
   const AtlasFile atlas = Open(path);
   const std::vector<Coordinate> places = RandomPlaces(atlas);
   const double before = PrivateKilobytes();
@@ -166,21 +171,14 @@ void Measure(const std::string& path, const std::string& databasePath, bench::Re
        {{"atlas", MegabytesOf(path), {}, {}}, {"SQLite R*Tree", MegabytesOf(databasePath), {}, {}}},
        {}});
   report.add({"private memory after all look-ups", "kB", {{"atlas", memory, {}, 512}}, {}});
-  const Coordinate vienna{48.2082, 16.3738};
-  report.add(
-      {"file not cached",
-       "ms",
-       {{"atlas: opening", ColdOpening(path, [&] { (void)Open(path); }), {}, 2},
-        {"atlas: opening and first look-up",
-         ColdOpening(path, [&] { (void)platform::AtlasGeocoder(path).lookUp(vienna); }),
-         {},
-         {}},
-        {"SQLite R*Tree: opening and first look-up",
-         ColdOpening(databasePath,
-                     [&] { (void)bench::SpatialDatabase(databasePath, atlas).lookUp(vienna); }),
-         {},
-         {}}},
-       {}});
+  const double otherAnswering = ColdOpening(
+      databasePath, [&] { (void)bench::SpatialDatabase(databasePath, atlas).lookUp(vienna); });
+  report.add({"file not cached",
+              "ms",
+              {{"atlas: opening", opening, {}, 2},
+               {"atlas: opening and first look-up", answering, {}, {}},
+               {"SQLite R*Tree: opening and first look-up", otherAnswering, {}, {}}},
+              {}});
 }
 
 }  // namespace
