@@ -11,10 +11,12 @@
 #include <cerrno>
 #include <cstring>
 
+#include "Helper/Heartbeat/EchoExchange.h"
 #include "Helper/Heartbeat/EchoRequest.h"
 #include "Helper/Platform/FileDescriptor.h"
 #include "Helper/Platform/Linux/HandsetErrors.h"
 #include "Tests/Fakes/FakeEchoService.h"
+#include "Tests/Support/WireClient.h"
 
 namespace {
 
@@ -166,6 +168,21 @@ TYPED_TEST(EchoServiceContract, ReadsBothClocks) {
   ASSERT_TRUE(this->network.service().uptime(second, error));
   EXPECT_GE(second.seconds * 1'000'000 + second.microseconds,
             first.seconds * 1'000'000 + first.microseconds);
+}
+
+TEST(RawEchoSocket, LeavesNoDescriptorBehindInAnHoursWorthOfExchanges) {
+  const RealNetwork network;
+  if (network.refusal()) GTEST_SKIP() << "no network of its own: " << network.refusal();
+  const platform::String target("127.0.0.1");
+  ASSERT_EQ(ExchangeEcho(target), 0);
+  const std::size_t descriptors = support::OpenDescriptors();
+  constexpr int kExchangesOfAnHour = 60 * 60 / 2;
+  int answered = 0;
+  for (int exchange = 0; exchange < kExchangesOfAnHour; ++exchange) {
+    if (ExchangeEcho(target) == 0) ++answered;
+  }
+  EXPECT_EQ(answered, kExchangesOfAnHour);
+  EXPECT_EQ(support::OpenDescriptors(), descriptors);
 }
 
 TEST(RawEchoSocket, CannotBeHadForAProtocolThatDoesNotExist) {
