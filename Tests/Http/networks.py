@@ -123,12 +123,18 @@ def far_side(interface, host, network6, report, begin):
     ip("address", "add", f"{network6}1/64", "dev", interface, "nodad")
     ip("link", "set", interface, "up")
     ip("address", "add", f"{WEB4}/32", "dev", "lo")
-    ip("address", "add", f"{WEB6}/128", "dev", "lo")
+    ip("address", "add", f"{WEB6}/128", "dev", "lo", "nodad")
     for each in (WEB4, WEB6):
         web_server.listen((each, 80))
     threading.Thread(target=serve_names, args=(host,), daemon=True).start()
     os.write(report, b"x")
     signal.pause()
+
+
+def wait_for(report):
+    """Waits for the word of the far side; it says none when it has failed."""
+    if not os.read(report, 1):
+        sys.exit("the far side of a link has failed")
 
 
 def link(name, far_name, network, metric, network6):
@@ -137,13 +143,14 @@ def link(name, far_name, network, metric, network6):
     process = os.fork()
     if process == 0:
         far_side(far_name, f"{network}.1", network6, reported, begun)
-    os.read(report, 1)
+    os.close(reported)
+    wait_for(report)
     ip("link", "add", name, "type", "veth", "peer", "name", far_name, "netns", str(process))
     set_ipv6(name, False)  # until it is up, so that it says nothing by itself
     ip("address", "add", f"{network}.2/24", "dev", name)
     ip("link", "set", name, "up")
     os.write(begin, b"x")
-    os.read(report, 1)
+    wait_for(report)
     ip("route", "add", "default", "via", f"{network}.1", "dev", name, "metric", str(metric))
 
 
