@@ -24,10 +24,11 @@ bool AsksForGzip(const vlu::Http::HeaderMap::value_type& field) {
   return ::strcasecmp(field.first.c_str(), kAcceptEncoding) == 0 && field.second == "gzip";
 }
 
-std::chrono::milliseconds LeftUntil(TimePoint deadline) {
-  // Zero would mean that there is no limit.
-  return std::max(std::chrono::milliseconds(1), std::chrono::ceil<std::chrono::milliseconds>(
-                                                    deadline - std::chrono::steady_clock::now()));
+/// At least one: zero would mean that there is no limit.
+long MillisecondsUntil(TimePoint deadline) {
+  const auto left =
+      std::chrono::ceil<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
+  return std::max(1L, static_cast<long>(left.count()));
 }
 
 }  // namespace
@@ -71,13 +72,13 @@ ErrorType HttpExchange::run(const std::string& url, const HttpTarget& target, Ti
   set(CURLOPT_BUFFERSIZE, kReceiveBuffer);
   setHeaders();
   setCallbacks();
+  const TimePoint connected =
+      std::min(deadline, std::chrono::steady_clock::now() + Duration(profile_.connectLimit));
   if (!transfer_.allowsCellular) {
-    const TimePoint resolved =
-        std::min(deadline, std::chrono::steady_clock::now() + Duration(profile_.connectLimit));
-    const ErrorType error = keepOffCellular(target, resolved);
+    const ErrorType error = keepOffCellular(target, connected);
     if (error != ErrorType::kSuccess) return error;
   }
-  setLimits(deadline);
+  setLimits(connected, deadline);
   if (!prepared_) return ErrorType::kUnknown;
   return errorOf(curl_.easyPerform(easy_.get()));
 }
@@ -104,10 +105,9 @@ ErrorType HttpExchange::keepOffCellular(const HttpTarget& target, TimePoint dead
   return ErrorType::kSuccess;
 }
 
-void HttpExchange::setLimits(TimePoint deadline) {
-  const auto left = LeftUntil(deadline);
-  set(CURLOPT_TIMEOUT_MS, static_cast<long>(left.count()));
-  set(CURLOPT_CONNECTTIMEOUT_MS, static_cast<long>(std::min(left, profile_.connectLimit).count()));
+void HttpExchange::setLimits(TimePoint connected, TimePoint deadline) {
+  set(CURLOPT_CONNECTTIMEOUT_MS, MillisecondsUntil(connected));
+  set(CURLOPT_TIMEOUT_MS, MillisecondsUntil(deadline));
   set(CURLOPT_LOW_SPEED_LIMIT, profile_.slowestRate);
   set(CURLOPT_LOW_SPEED_TIME, static_cast<long>(profile_.quietLimit.count()));
   set(CURLOPT_MAXFILESIZE_LARGE, static_cast<curl_off_t>(profile_.longestBody));

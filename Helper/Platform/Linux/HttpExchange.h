@@ -41,7 +41,7 @@ class HttpExchange {
   void set(CURLoption option, Value value);
   void append(Strings& strings, const std::string& text);
   [[nodiscard]] vlu::Http::ErrorType keepOffCellular(const HttpTarget& target, TimePoint deadline);
-  void setLimits(TimePoint deadline);
+  void setLimits(TimePoint connected, TimePoint deadline);
   void setHeaders();
   void setCallbacks();
   [[nodiscard]] vlu::Http::ErrorType errorOf(CURLcode code) const;

@@ -27,7 +27,7 @@ class HttpTransport {
   [[nodiscard]] virtual bool accepts(const std::string& url) = 0;
 
   /// Retrieves what `transfer` says and waits for it, in bounded time. Follows a few redirects,
-  /// none from https to http. Empty only when memory does not even suffice to report a failure.
+  /// none from https to http. Empty when there is neither a response nor a failure to tell of.
   [[nodiscard]] virtual std::shared_ptr<HttpResponse> retrieve(const Transfer& transfer) = 0;
 };
 
