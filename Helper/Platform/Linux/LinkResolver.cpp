@@ -144,7 +144,7 @@ bool ReceiveWhole(const FileDescriptor& socket, std::span<std::uint8_t> bytes, T
 
 /// The reply over TCP, each message behind its 16-bit length (RFC 1035, section 4.2.2).
 DnsReply AskByTcp(const SocketAddress& server, const Bytes& query, TimePoint deadline) {
-  const DnsReply none{DnsReply::Kind::kRefused, {}};
+  DnsReply none{DnsReply::Kind::kRefused, {}};
   const FileDescriptor socket = EligibleSocket(server.get(), SOCK_STREAM | SOCK_NONBLOCK, 0);
   if (!socket ||
       (::connect(socket.get(), &server.get(), server.length) != 0 && errno != EINPROGRESS)) {
