@@ -15,18 +15,18 @@ ln -sf /usr/share/zoneinfo/Europe/Zurich /etc/localtime
 show $tools/halvecctl location country
 
 if [ -z "$quick" ]; then
-say "A look-up that takes too long: strace holds it up for six seconds where it opens its atlas. \
+  say "A look-up that takes too long: strace holds it up for six seconds where it opens its atlas. \
 After five the telephony daemon is told the country alone; the late answer is dropped."
-helper=$(handset wait-start --timeout 5)
-lines=$(handset log | wc -l)
-strace -f -qq -o /dev/null -p "$helper" -P $atlas -e trace=openat \
-  -e inject=openat:delay_enter=6000000 2>/dev/null &
-tracer=$!
-until grep -q '^TracerPid:.[1-9]' "/proc/$helper/status"; do :; done
-locate 47.3769 8.5417
-handset log --skip "$lines" --follow-until "wasn't waiting" --timeout 20
-kill $tracer
-wait $tracer 2>/dev/null || true
+  helper=$(handset wait-start --timeout 5)
+  lines=$(handset log | wc -l)
+  strace -f -qq -o /dev/null -p "$helper" -P $atlas -e trace=openat \
+    -e inject=openat:delay_enter=6000000 2>/dev/null &
+  tracer=$!
+  until grep -q '^TracerPid:.[1-9]' "/proc/$helper/status"; do :; done
+  locate 47.3769 8.5417
+  handset log --skip "$lines" --follow-until "wasn't waiting" --timeout 20
+  kill $tracer
+  wait $tracer 2>/dev/null || true
 fi
 
 say "In time: Zurich, Hong Kong, San Juan of Puerto Rico, Monaco, Malindi in Kenya, Suva in Fiji."
