@@ -121,4 +121,20 @@ TEST(Json, RefusesEveryPrefixOfADocument) {
   }
 }
 
+TEST(Json, MakesSomethingThatCanBeWrittenOrNothingOfEveryTextOneByteAway) {
+  const std::string text = R"({"a":["\u20ac\ud83d\ude00",-1.5e2,true,null],"b":{},"c":10})";
+  std::size_t accepted = 0;
+  for (std::size_t at = 0; at < text.size(); ++at) {
+    for (int byte = 0; byte < 256; ++byte) {
+      std::string changed = text;
+      changed[at] = static_cast<char>(byte);
+      const auto value = ParseJson(changed);
+      if (!value) continue;
+      ++accepted;
+      EXPECT_TRUE(platform::SerializeBinary(*value)) << changed;
+    }
+  }
+  EXPECT_GT(accepted, text.size());
+}
+
 }  // namespace
