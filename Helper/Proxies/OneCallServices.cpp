@@ -29,10 +29,6 @@ VoicemailSubscriptionFunction* LoadVoicemailSubscriptionFunction() {
   platform::SharedLibrary library(HALVEC_VOICEMAIL_LIBRARY);
   VoicemailSubscriptionFunction* function = nullptr;
   library.bind(function, HALVEC_VOICEMAIL_SYMBOL);
-  if (!function) {
-    Log(LogPriority::kNotice, "No visual-voicemail subscription to ask for: %s",
-        library.failure().c_str());
-  }
   return function;
 }
 

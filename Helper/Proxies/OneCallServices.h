@@ -10,8 +10,8 @@
 using VoicemailSubscriptionFunction = std::uint8_t();
 
 /// Opens the visual-voicemail library of the build with lazy binding and finds its subscription
-/// function; null, with one notice in the log, when the library or the function is missing. The
-/// library stays open for the life of the process.
+/// function; null when the library or the function is missing. The library stays open for the life
+/// of the process.
 [[nodiscard]] VoicemailSubscriptionFunction* LoadVoicemailSubscriptionFunction();
 
 /// What the visual-voicemail library answers; false when it cannot be had. It is looked for once in

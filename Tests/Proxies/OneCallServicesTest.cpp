@@ -58,7 +58,7 @@ TEST_F(OneCallServices, AnswerFalseForTheSubscriptionWithoutTheLibraryAndLookFor
     EXPECT_EQ(request(*client, support::Message(kIsSubscribed, 24)).bytes,
               successReply(kIsSubscribed, 40));
   }
-  EXPECT_LE(log.takeLines().size(), 1U);
+  EXPECT_TRUE(log.takeLines().empty());
 }
 
 TEST_F(OneCallServices, MayBeAskedForTheSubscriptionFromManyThreadsAtOnce) {
@@ -69,12 +69,9 @@ TEST_F(OneCallServices, MayBeAskedForTheSubscriptionFromManyThreadsAtOnce) {
   for (std::thread& thread : threads) thread.join();
 }
 
-TEST_F(OneCallServices, SayWhatIsMissingWhenTheSubscriptionFunctionCannotBeHad) {
+TEST_F(OneCallServices, FindNoSubscriptionFunctionWithoutTheLibraryAndSayNothing) {
   EXPECT_EQ(LoadVoicemailSubscriptionFunction(), nullptr);
-  const Lines lines = log.takeLines();
-  ASSERT_EQ(lines.size(), 1U);
-  EXPECT_EQ(lines[0].first, LogPriority::kNotice);
-  EXPECT_NE(lines[0].second.find(HALVEC_VOICEMAIL_LIBRARY), std::string::npos) << lines[0].second;
+  EXPECT_TRUE(log.takeLines().empty());
 }
 
 TEST_F(OneCallServices, TellTheRadioManagerBeforeTheyLogTheIntegerAsItCame) {
