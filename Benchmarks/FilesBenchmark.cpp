@@ -3,19 +3,16 @@
 // FilesBenchmark: copies, merges and changes of owner beside cp and chown, turn by turn. One
 // thread. FilesBenchmark [--json] [FOLDER]; needs 3 GiB in FOLDER (the folder for temporary files)
 // and, for owners, root.
-#include <fcntl.h>
-#include <spawn.h>
-#include <sys/stat.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <cstdio>
 #include <filesystem>
 #include <fstream>
+#include <functional>
 #include <string>
 #include <string_view>
-#include <vector>
 
+#include "Benchmarks/Support/Compare.h"
 #include "Benchmarks/Support/Measure.h"
 #include "Benchmarks/Support/Report.h"
 #include "Helper/Files/FileUtilities.h"
@@ -24,23 +21,11 @@ namespace {
 
 namespace fs = std::filesystem;
 using bench::Fail;
-using bench::MicrosecondsOf;
+using bench::Run;
 using platform::FileManager;
 
 constexpr int kFolders = 100;
 constexpr int kFilesPerFolder = 100;
-
-void Run(std::vector<std::string> words) {
-  std::vector<char*> arguments;
-  for (std::string& word : words) arguments.push_back(word.data());
-  arguments.push_back(nullptr);
-  pid_t child = -1;
-  int status = -1;
-  if (::posix_spawnp(&child, arguments[0], nullptr, nullptr, arguments.data(), environ) != 0 ||
-      ::waitpid(child, &status, 0) != child || status != 0) {
-    Fail(words[0].c_str());
-  }
-}
 
 void MakeTree(const fs::path& root) {
   for (int i = 0; i < kFolders; ++i) {
@@ -59,28 +44,17 @@ void Require(bool good, const char* what) {
   if (!good) Fail(what);
 }
 
-/// Runs both in turn, each after `prepare`, and adds the comparison; the peer is 1.00.
-template <class Ours, class Theirs, class Prepare>
-bench::Table Compare(const char* title, const char* peer, double goal, int turns, Prepare prepare,
-                     Ours ours, Theirs theirs) {
-  std::vector<double> our, their;
-  for (int turn = 0; turn < turns; ++turn) {
-    // Who goes first changes, so that neither always finds the other's leavings.
-    for (int step = 0; step < 2; ++step) {
-      prepare();
-      ::sync();
-      if ((turn + step) % 2 == 0) {
-        our.push_back(MicrosecondsOf(ours) / 1000);
-      } else {
-        their.push_back(MicrosecondsOf(theirs) / 1000);
-      }
-    }
-  }
-  return {.title = title,
-          .unit = "ms",
-          .figures = {{peer, bench::Median(their), 1.0, {}},
-                      {"ours", bench::Median(our), bench::PairedRatio(our, their), goal}},
-          .notes = {}};
+/// Runs both in turn, each after `prepare`, and compares them; the peer is 1.00.
+bench::Table Compare(const char* title, const char* peer, double goal, int turns,
+                     const std::function<void()>& prepare, const std::function<void()>& ours,
+                     const std::function<void()>& theirs) {
+  const auto times = bench::TakeTurns(turns, prepare, {ours, theirs});
+  return {
+      .title = title,
+      .unit = "ms",
+      .figures = {{peer, bench::Median(times[1]), 1.0, {}},
+                  {"ours", bench::Median(times[0]), bench::PairedRatio(times[0], times[1]), goal}},
+      .notes = {}};
 }
 
 bench::Table CopyTree(const fs::path& root) {
@@ -158,6 +132,7 @@ int main(int count, char** arguments) {
   std::string name = base / "files-benchmark-XXXXXX";
   if (::mkdtemp(name.data()) == nullptr) Fail("make a folder");
   const fs::path root = name;
+  (void)bench::TakePrecedence();  // without it the figures are only less steady
   bench::Report report(json);
   MakeTree(root / "tree");
   report.add(CopyTree(root));

@@ -55,7 +55,7 @@ class ArchiveWriter : public testing::Test {
  protected:
   int file(const std::string& path, const std::string& text, const ArchiveItemStatus& status = {}) {
     platform::NewFile file;
-    if (const int error = writer.beginFile(path, file)) return error;
+    if (const int error = writer.beginFile(path, status, file)) return error;
     EXPECT_EQ(platform::ArchiveWriter::write(file, std::as_bytes(std::span(text)), 0), 0);
     return writer.finishFile(file, path, status);
   }

@@ -117,7 +117,8 @@ TEST_F(CarrierBundleLinks, SetWithoutADomainMakesTheLinkShowsItAndFlushesNothing
   EXPECT_FALSE(isFlushed());
   const Lines lines = log.takeLines();
   ASSERT_EQ(lines.size(), 2U);
-  EXPECT_EQ(lines[1].second, std::string("linkpath: ") + kBundle + ", domain: ");
+  EXPECT_EQ(lines[1], (fakes::FakeSystemLog::Line{
+                          LogPriority::kInfo, std::string("linkpath: ") + kBundle + ", domain: "}));
 }
 
 TEST_F(CarrierBundleLinks, SetThatCannotLinkAnswers5LogsNoLinkAndFlushesNothing) {
@@ -137,7 +138,9 @@ TEST_F(CarrierBundleLinks, SetWithADomainThatIsNotUtf8MakesTheLinkAndFlushesNoth
   EXPECT_FALSE(isFlushed());
   const Lines lines = log.takeLines();
   ASSERT_EQ(lines.size(), 2U);
-  EXPECT_EQ(lines[1].second, std::string("linkpath: ") + kBundle + ", domain: \xff");
+  EXPECT_EQ(lines[1],
+            (fakes::FakeSystemLog::Line{LogPriority::kInfo,
+                                        std::string("linkpath: ") + kBundle + ", domain: \xff"}));
 }
 
 TEST_F(CarrierBundleLinks, SetDoesNotExamineTheTarget) {
@@ -236,7 +239,9 @@ TEST_F(CarrierBundleLinks, ReadAFieldWithoutItsZeroAsItsFirst1023Bytes) {
   EXPECT_EQ(log.takeLines(),
             (Lines{{LogPriority::kError, "Cannot remove symlink: " + full.substr(0, 1023)}}));
   EXPECT_EQ(removeLink(full, full), 8);
-  EXPECT_EQ(log.takeLines().front().second, "Removing domain: " + full.substr(0, 1023) + "\n");
+  EXPECT_EQ(log.takeLines().front(),
+            (fakes::FakeSystemLog::Line{LogPriority::kNotice,
+                                        "Removing domain: " + full.substr(0, 1023) + "\n"}));
 }
 
 }  // namespace

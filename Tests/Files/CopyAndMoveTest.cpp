@@ -194,8 +194,9 @@ TEST_F(CopyAndMove, NameTheDirectoryNotTheBundleWhenAMoveFails) {
 
 TEST_F(CopyAndMove, KeepADoubledSlash) {
   EXPECT_EQ(send(kCopyFile, {"/source", "/etc/", "file"}), 0U);
-  EXPECT_EQ(lines().back().second,
-            "Destination directory /etc//file is not within the allowed directories\n");
+  EXPECT_EQ(lines().back(),
+            (Line{LogPriority::kError,
+                  "Destination directory /etc//file is not within the allowed directories\n"}));
 }
 
 }  // namespace

@@ -41,16 +41,16 @@ using WorkName = NewFile;
 
 TEST_F(NewFile, HasNoNameBeforeItIsGivenOne) {
   platform::NewFile file;
-  ASSERT_EQ(file.make(open.get()), 0);
+  ASSERT_EQ(file.make(open.get(), 0640), 0);
   write(file, "text");
   EXPECT_EQ(folder.names(), Names{});
   EXPECT_EQ(file.giveName("file", IfTaken::kFail), 0);
   EXPECT_EQ(folder.text("file"), "text");
-  EXPECT_EQ(folder.permissions("file"), 0600U);
+  EXPECT_EQ(folder.permissions("file"), 0640U);
 }
 
 TEST_F(NewFile, LeavesNothingWhenItIsDropped) {
-  { ASSERT_EQ(platform::NewFile().make(open.get()), 0); }
+  { ASSERT_EQ(platform::NewFile().make(open.get(), 0640), 0); }
   EXPECT_EQ(folder.names(), Names{});
 }
 
@@ -61,7 +61,7 @@ TEST_F(NewFile, ReplacesFilesAndLinksButNoDirectory) {
   folder.folder("folder");
   for (const char* name : {"file", "link", "folder"}) {
     platform::NewFile file;
-    ASSERT_EQ(file.make(open.get()), 0);
+    ASSERT_EQ(file.make(open.get(), 0640), 0);
     write(file, "new");
     EXPECT_EQ(file.giveName(name, IfTaken::kFail), EEXIST) << name;
     const bool isFolder = name == std::string("folder");
@@ -74,7 +74,7 @@ TEST_F(NewFile, ReplacesFilesAndLinksButNoDirectory) {
 }
 
 TEST_F(NewFile, CannotBeMadeWhereThereIsNoFolder) {
-  EXPECT_EQ(platform::NewFile().make(-1), EBADF);
+  EXPECT_EQ(platform::NewFile().make(-1, 0640), EBADF);
 }
 
 /// From here on this process has file systems without unnamed files only.
@@ -102,13 +102,14 @@ TEST_F(NewFile, HasAWorkNameOnAFileSystemWithoutUnnamedFiles) {
       {
         ForbidUnnamedFiles();
         platform::NewFile file;
-        EXPECT_EQ(file.make(open.get()), 0);
+        EXPECT_EQ(file.make(open.get(), 0640), 0);
         write(file, "new");
         EXPECT_EQ(folder.names(), (Names{"taken", ".halvec-copy-0"}));
+        EXPECT_EQ(folder.permissions(".halvec-copy-0"), 0600U) << "others can see it";
         EXPECT_EQ(file.giveName("taken", IfTaken::kFail), EEXIST);
         EXPECT_EQ(file.giveName("taken", IfTaken::kReplace), 0);
         EXPECT_EQ(folder.text("taken"), "new");
-        { EXPECT_EQ(platform::NewFile().make(open.get()), 0); }
+        { EXPECT_EQ(platform::NewFile().make(open.get(), 0640), 0); }
         EXPECT_EQ(folder.names(), Names{"taken"});
         ::_exit(testing::Test::HasFailure() ? 1 : 0);
       },

@@ -120,10 +120,11 @@ int ArchiveWriter::makeLink(const std::string& path, const std::string& target,
   return 0;
 }
 
-int ArchiveWriter::beginFile(const std::string& path, NewFile& file) {
+int ArchiveWriter::beginFile(const std::string& path, const ArchiveItemStatus& status,
+                             NewFile& file) {
   if (path.empty()) return EISDIR;
   if (const int error = openFolderOf(path)) return error;
-  return file.make(folder_.get());
+  return file.make(folder_.get(), PermissionsOf(status, kFileMode));
 }
 
 int ArchiveWriter::write(const NewFile& file, std::span<const std::byte> bytes, off_t offset) {
@@ -133,10 +134,9 @@ int ArchiveWriter::write(const NewFile& file, std::span<const std::byte> bytes, 
 int ArchiveWriter::finishFile(NewFile& file, const std::string& path,
                               const ArchiveItemStatus& status) {
   const timespec times[2] = {status.accessed, status.modified};
-  if (::fchmod(file.descriptor(), PermissionsOf(status, kFileMode)) != 0 ||
-      ::futimens(file.descriptor(), times) != 0) {
-    return errno;
-  }
+  const int error = SetPermissions(file.descriptor(), PermissionsOf(status, kFileMode));
+  if (error != 0) return error;
+  if (::futimens(file.descriptor(), times) != 0) return errno;
   return file.giveName(NameOf(path), IfTaken::kReplace);
 }
 

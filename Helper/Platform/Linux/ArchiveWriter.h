@@ -47,7 +47,8 @@ class ArchiveWriter {
 
   /// Begins a file in the folder of `path`, to be finished before anything else is made; what is
   /// not finished leaves nothing behind.
-  [[nodiscard]] int beginFile(const std::string& path, NewFile& file);
+  [[nodiscard]] int beginFile(const std::string& path, const ArchiveItemStatus& status,
+                              NewFile& file);
   [[nodiscard]] static int write(const NewFile& file, std::span<const std::byte> bytes,
                                  off_t offset);
   /// Gives the file its status and, at last, its name.

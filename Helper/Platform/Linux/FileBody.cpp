@@ -119,13 +119,24 @@ int CopyFileBytes(int from, int to, const struct stat& status) {
   return CopyRange(from, to, 0, status.st_size);
 }
 
+int SetPermissions(int to, mode_t permissions) {
+  struct stat status {};
+  if (::fstat(to, &status) != 0) return errno;
+  // To look is cheaper than to set what is so already.
+  if ((status.st_mode & 07777) == permissions) return 0;
+  return ::fchmod(to, permissions) == 0 ? 0 : errno;
+}
+
 int CopyFileAttributes(int from, int to, const struct stat& status) {
-  if (::fchown(to, status.st_uid, status.st_gid) != 0 && errno != EPERM && errno != EINVAL) {
+  struct stat made {};
+  if (::fstat(to, &made) != 0) return errno;
+  if ((made.st_uid != status.st_uid || made.st_gid != status.st_gid) &&
+      ::fchown(to, status.st_uid, status.st_gid) != 0 && errno != EPERM && errno != EINVAL) {
     return errno;
   }
   if (const int error = CopyExtendedAttributes(from, to)) return error;
   const mode_t carried = S_ISDIR(status.st_mode) ? 01777 : 0777;
-  if (::fchmod(to, status.st_mode & carried) != 0) return errno;
+  if (const int error = SetPermissions(to, status.st_mode & carried)) return error;
   const timespec times[2] = {status.st_atim, status.st_mtim};
   return ::futimens(to, times) == 0 ? 0 : errno;
 }

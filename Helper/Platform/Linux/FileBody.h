@@ -19,6 +19,9 @@ namespace platform {
 /// Copies what `from` holds into the new, empty file `to`. Holes stay holes. An error number, or 0.
 [[nodiscard]] int CopyFileBytes(int from, int to, const struct stat& status);
 
+/// Gives a file or folder these permissions unless it has them. An error number, or 0.
+[[nodiscard]] int SetPermissions(int to, mode_t permissions);
+
 /// Gives `to` the owner, extended attributes, permissions and times of `from`, whose status is
 /// given. An owner that the process may not give is left; so is an attribute that the destination's
 /// file system does not keep. An error number, or 0.

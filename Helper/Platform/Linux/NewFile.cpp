@@ -26,9 +26,9 @@ NewFile::~NewFile() {
   if (!workName_.empty()) ::unlinkat(folder_, workName_.c_str(), 0);
 }
 
-int NewFile::make(int folder) {
+int NewFile::make(int folder, mode_t permissions) {
   folder_ = folder;
-  item_.reset(::openat(folder, ".", O_TMPFILE | O_WRONLY | O_CLOEXEC, 0600));
+  item_.reset(::openat(folder, ".", O_TMPFILE | O_WRONLY | O_CLOEXEC, permissions));
   if (item_) return 0;
   // These are the ways to say that the file system has no files without names.
   if (errno != EOPNOTSUPP && errno != EISDIR && errno != ENOENT) return errno;

@@ -5,6 +5,8 @@
 // (WorkName.h). One thread; no lock.
 #pragma once
 
+#include <sys/types.h>
+
 #include <string>
 
 #include "Helper/Platform/FileDescriptor.h"
@@ -24,8 +26,10 @@ class NewFile {
   /// Drops what has not been named.
   ~NewFile();
 
-  /// Makes it, empty, mode 0600, in a folder that is borrowed until the end. An error number or 0.
-  [[nodiscard]] int make(int folder);
+  /// Makes it, empty, in a folder that is borrowed until the end. Where nobody else can reach it
+  /// before it has a name, it has these permissions already, less the process's umask; else 0600.
+  /// An error number or 0.
+  [[nodiscard]] int make(int folder, mode_t permissions);
   /// Open for writing.
   [[nodiscard]] int descriptor() const { return item_.get(); }
   /// Gives it its name in its folder. An error number, and then it is not there, or 0.

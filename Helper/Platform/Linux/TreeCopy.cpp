@@ -17,6 +17,8 @@
 namespace platform {
 namespace {
 
+constexpr mode_t kPermissionBits = 0777;
+
 int CopyLink(int fromFolder, const char* from, int toFolder, const char* to,
              const struct stat& status) {
   std::array<char, PATH_MAX> target;
@@ -49,7 +51,7 @@ int CopyLoneFile(int fromFolder, const char* from, int toFolder, const char* to)
   NewFile target;
   struct stat status {};
   int error = OpenSource(fromFolder, from, source, status);
-  if (error == 0) error = target.make(toFolder);
+  if (error == 0) error = target.make(toFolder, status.st_mode & kPermissionBits);
   if (error == 0) error = CopyContent(source.get(), target.descriptor(), status);
   return error != 0 ? error : target.giveName(to, IfTaken::kFail);
 }
@@ -101,8 +103,10 @@ class TreeCopy {
     FileDescriptor source;
     struct stat status {};
     if (const int error = OpenSource(fromFolder, name, source, status)) return error;
-    const FileDescriptor target(
-        ::openat(toFolder, name, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
+    // Nobody else gets into the folders of the copy before they have their attributes.
+    const FileDescriptor target(::openat(toFolder, name,
+                                         O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC,
+                                         status.st_mode & kPermissionBits));
     if (!target) return errno;
     const int error = CopyContent(source.get(), target.get(), status);
     if (error != 0) ::unlinkat(toFolder, name, 0);

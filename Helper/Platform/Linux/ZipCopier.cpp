@@ -97,7 +97,7 @@ class Extraction {
 
   int extractFile(const std::string& path, const ArchiveItemStatus& status) {
     NewFile file;
-    if (const int error = writer_.beginFile(path, file)) return error;
+    if (const int error = writer_.beginFile(path, status, file)) return error;
     ZipBlock block;
     ZipResult result = reader_.read(block);
     for (; result == ZipResult::kGood; result = reader_.read(block)) {
