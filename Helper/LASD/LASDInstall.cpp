@@ -113,10 +113,11 @@ bool LASDUpdater::installDatabase(const std::string& url, LASDDatabaseType type)
   if (!name) return false;
   const std::string finalPath = directory_ + "/" + *name;
   const std::string temporaryPath = finalPath + ".tmp";
-  // The name must be on the disk before the record is: a power cut may not leave a record without
-  // its file.
-  return WriteDatabase(downloader, temporaryPath) && Exchange(temporaryPath, finalPath) &&
-         Synchronize(directory_) && record(type);
+  if (!WriteDatabase(downloader, temporaryPath) || !Exchange(temporaryPath, finalPath))
+    return false;
+  // The file's name, and that of a new directory, are on the disk before the record is: a power cut
+  // may not leave a record without its file.
+  return Synchronize(directory_) && Synchronize(directory_ + "/..") && record(type);
 }
 
 bool LASDUpdater::makeDirectory() const {
