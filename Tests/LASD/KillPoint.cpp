@@ -61,9 +61,11 @@ bool Note(const char* name) {
   return ++count == chosen;
 }
 
-void Kill() {
-  (void)::kill(::getpid(), SIGKILL);
-  for (;;) ::pause();
+/// As a kill: nothing is flushed, no handler runs. The helper's own filter of system calls allows
+/// it no signals, so that it cannot kill itself by one.
+[[noreturn]] void Kill() {
+  constexpr int kStatus = 128 + SIGKILL;
+  for (;;) ::syscall(SYS_exit_group, kStatus);
 }
 
 template <class Function, class... Arguments>
@@ -106,7 +108,6 @@ ssize_t write(int file, const void* bytes, size_t size) {
   if (!Note("write")) return next(file, bytes, size);
   (void)next(file, bytes, size / 2);
   Kill();
-  return -1;
 }
 
 ssize_t writev(int file, const iovec* parts, int count) {

@@ -12,7 +12,8 @@ namespace {
 
 using process_tests::Outcome;
 
-class KilledInstall : public process_tests::ProcessSuite {
+/// The parameter tells which half of the calls is tried: 0 the even ones, 1 the odd ones.
+class KilledInstall : public process_tests::ProcessSuite, public testing::WithParamInterface<int> {
  protected:
   /// Runs install_kills.py with `scenario`; what it printed.
   static Outcome tryEveryCall(const std::string& scenario) {
@@ -24,23 +25,26 @@ class KilledInstall : public process_tests::ProcessSuite {
                               "export ASAN_OPTIONS=$ASAN_OPTIONS:verify_asan_link_order=0\n"
                               "exec /usr/libexec/halvec/helper\n";
     ::chmod(starter.c_str(), 0755);
-    return run(
-        lasd_test::kServe + "python3 /mnt/install_kills.py /tmp/web " MANIFEST_HOST " " + scenario,
-        {"--helper", starter, "--install", KILL_POINT ":kill-point.so", "--bind",
-         LASD_TESTS ":/mnt"});
+    return run(lasd_test::kServe + "python3 /mnt/install_kills.py /tmp/web " MANIFEST_HOST " " +
+                   scenario + " " + std::to_string(GetParam()),
+               {"--helper", starter, "--install", KILL_POINT ":kill-point.so", "--bind",
+                LASD_TESTS ":/mnt"});
   }
 };
 
-TEST_F(KilledInstall, LeavesTheOldFileOrTheNewOneOrNoneAndNeverARecordWithoutItsFile) {
+TEST_P(KilledInstall, LeavesTheOldFileOrTheNewOneOrNoneAndNeverARecordWithoutItsFile) {
   const Outcome outcome = tryEveryCall("renewal");
   EXPECT_EQ(outcome.status, 0) << outcome.errors;
   EXPECT_TRUE(outcome.output.ends_with(" calls\n")) << outcome.output << outcome.errors;
 }
 
-TEST_F(KilledInstall, LeavesTheNewFileOrNoneWhereThereWasNone) {
+TEST_P(KilledInstall, LeavesTheNewFileOrNoneWhereThereWasNone) {
   const Outcome outcome = tryEveryCall("first");
   EXPECT_EQ(outcome.status, 0) << outcome.errors;
   EXPECT_TRUE(outcome.output.ends_with(" calls\n")) << outcome.output << outcome.errors;
 }
+
+INSTANTIATE_TEST_SUITE_P(Calls, KilledInstall, testing::Values(0, 1),
+                         [](const auto& half) { return half.param == 0 ? "Even" : "Odd"; });
 
 }  // namespace
