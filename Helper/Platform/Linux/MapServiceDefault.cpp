@@ -1,9 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // The map service of this system: the atlas, and the online geocoder where the build names one.
-#include <string>
-#include <string_view>
-
 #include "Helper/Platform/Linux/AtlasGeocoder.h"
 #include "Helper/Platform/Linux/GeocoderChain.h"
 #include "Helper/Platform/Linux/GeocodingMapService.h"
@@ -12,14 +9,14 @@
 namespace platform {
 namespace {
 
-constexpr std::string_view kEndpoint = HALVEC_GEOCODER_ENDPOINT;
+constexpr const char* kEndpoint = HALVEC_GEOCODER_ENDPOINT;
 /// Less than the five seconds after which nobody waits for the answer any more.
 constexpr Duration kOnlineLimit = std::chrono::seconds(4);
 
 MapService& MakeMapService() {
   auto& atlas = *new AtlasGeocoder(HALVEC_ATLAS_FILE);
-  if (kEndpoint.empty()) return *new GeocodingMapService(atlas, atlas);
-  auto& online = *new NominatimGeocoder(std::string(kEndpoint), kOnlineLimit);
+  if (*kEndpoint == '\0') return *new GeocodingMapService(atlas, atlas);
+  auto& online = *new NominatimGeocoder(kEndpoint, kOnlineLimit);
   return *new GeocodingMapService(*new GeocoderChain(atlas, online), atlas);
 }
 
