@@ -31,16 +31,15 @@ TEST_F(Subscription, IsFalseForTheLifeOfAHelperThatDidNotFindTheLibrary) {
   const Outcome outcome = run("touch /tmp/subscribed; halvecctl voicemail subscribed\n" + kInstall +
                                   "halvecctl voicemail subscribed; handset kill KILL\n"
                                   "handset wait-exit >/dev/null; halvecctl voicemail subscribed\n"
-                                  "handset log | grep -c 'subscription to ask for'",
+                                  "handset log",
                               kLibrary);
-  EXPECT_EQ(outcome.output, "false\nfalse\ntrue\n1\n") << outcome.errors;
+  EXPECT_EQ(outcome.output, "false\nfalse\ntrue\n") << outcome.errors;
 }
 
 TEST_F(Subscription, IsFalseWhereTheLibraryLacksTheFunction) {
-  const Outcome outcome =
-      run("install -D /lib/x86_64-linux-gnu/libm.so.6 " + kPlace +
-          "; halvecctl voicemail subscribed; handset log | grep -c " HALVEC_VOICEMAIL_SYMBOL);
-  EXPECT_EQ(outcome.output, "false\n1\n") << outcome.errors;
+  const Outcome outcome = run("install -D /lib/x86_64-linux-gnu/libm.so.6 " + kPlace +
+                              "; halvecctl voicemail subscribed; handset log");
+  EXPECT_EQ(outcome.output, "false\n") << outcome.errors;
 }
 
 TEST_F(RadioLog, ReachesTheRadioManagersPortAndIsLoggedAsItCame) {
