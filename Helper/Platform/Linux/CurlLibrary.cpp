@@ -4,6 +4,7 @@
 #include <strings.h>
 
 #include <algorithm>
+#include <cstdint>
 #include <memory>
 
 #include "Helper/Platform/SystemLog.h"
@@ -20,9 +21,21 @@ std::string PartOf(const CurlLibrary& curl, CURLU* url, CURLUPart part, unsigned
   return text;
 }
 
+/// A transfer that was given up may still be under way when the process ends. The TLS library would
+/// take its tables away under it at that moment, unless it is told not to before its first use.
+void KeepTlsUntilTheEnd() {
+  constexpr std::uint64_t kNoCleanUpAtExit = 0x00080000;  // OPENSSL_INIT_NO_ATEXIT
+  SharedLibrary library("libcrypto.so.3");
+  int (*initialise)(std::uint64_t, const void*) = nullptr;
+  library.bind(initialise, "OPENSSL_init_crypto");
+  // With another TLS library there is nothing to keep.
+  if (initialise) (void)initialise(kNoCleanUpAtExit, nullptr);
+}
+
 }  // namespace
 
 CurlLibrary::CurlLibrary() {
+  KeepTlsUntilTheEnd();
   library_.bind(easyInit, "curl_easy_init");
   library_.bind(easySetopt, "curl_easy_setopt");
   library_.bind(easyGetinfo, "curl_easy_getinfo");
