@@ -68,7 +68,7 @@ TEST_F(FilesInMotion, MayGrowWhileTheyAreCopied) {
   folder.file("log", "start");
   const Meanwhile grow([&] {
     std::ofstream(at("log"), std::ios::app) << "another line\n";
-    if (folder.status("log").st_size > kMost) ::truncate(at("log").c_str(), 5);
+    if (folder.status("log").st_size > kMost) EXPECT_EQ(::truncate(at("log").c_str(), 5), 0);
   });
   for (int turn = 0; turn < kTurns; ++turn) {
     ASSERT_TRUE(manager.copyItem(at("log"), at("copy"), nullptr));
@@ -80,8 +80,8 @@ TEST_F(FilesInMotion, MayGrowWhileTheyAreCopied) {
 
 TEST_F(FilesInMotion, MayBecomeShorterWhileTheyAreCopied) {
   const Meanwhile shrink([&] {
-    ::truncate(at("tree/a").c_str(), 1 << 20);
-    ::truncate(at("tree/a").c_str(), 0);
+    EXPECT_EQ(::truncate(at("tree/a").c_str(), 1 << 20), 0);
+    EXPECT_EQ(::truncate(at("tree/a").c_str(), 0), 0);
   });
   for (int turn = 0; turn < kTurns; ++turn) {
     EXPECT_TRUE(manager.copyItem(at("tree"), at("copy"), nullptr));
