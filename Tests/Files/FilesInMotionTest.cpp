@@ -68,7 +68,9 @@ TEST_F(FilesInMotion, MayGrowWhileTheyAreCopied) {
   folder.file("log", "start");
   const Meanwhile grow([&] {
     std::ofstream(at("log"), std::ios::app) << "another line\n";
-    if (folder.status("log").st_size > kMost) EXPECT_EQ(::truncate(at("log").c_str(), 5), 0);
+    if (folder.status("log").st_size > kMost) {
+      EXPECT_EQ(::truncate(at("log").c_str(), 5), 0);
+    }
   });
   for (int turn = 0; turn < kTurns; ++turn) {
     ASSERT_TRUE(manager.copyItem(at("log"), at("copy"), nullptr));

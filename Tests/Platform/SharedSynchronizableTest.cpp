@@ -22,14 +22,15 @@ thread_local bool nextAllocationFails = false;
 
 }  // namespace
 
-// The test's own, in the whole program: there is no other way to run out of memory at will.
-void* operator new(std::size_t size) {
+// The test's own, in the whole program: there is no other way to run out of memory at will. Not
+// inlined, or the compiler takes free() for the wrong partner of new.
+[[gnu::noinline]] void* operator new(std::size_t size) {
   if (std::exchange(nextAllocationFails, false)) throw std::bad_alloc();
   if (void* memory = std::malloc(size)) return memory;
   throw std::bad_alloc();
 }
-void operator delete(void* memory) noexcept { std::free(memory); }
-void operator delete(void* memory, std::size_t) noexcept { std::free(memory); }
+[[gnu::noinline]] void operator delete(void* memory) noexcept { std::free(memory); }
+[[gnu::noinline]] void operator delete(void* memory, std::size_t) noexcept { std::free(memory); }
 
 namespace {
 

@@ -36,13 +36,13 @@ struct OneWayMessage {
 /// The datagram. `message.payload` is at most kOneWayPayloadLimit long.
 [[nodiscard]] inline std::vector<std::byte> EncodeOneWay(const OneWayMessage& message) {
   const std::size_t length = message.payload.size();
-  std::vector<std::byte> datagram(OneWaySize(length));
-  const MessageHeader header{.size = static_cast<std::uint32_t>(datagram.size()), .id = message.id};
-  Store(datagram.data(), header);
+  const std::size_t size = OneWaySize(length);
+  std::vector<std::byte> datagram(kOneWayPayloadOffset);
+  datagram.reserve(size);
+  Store(datagram.data(), MessageHeader{.size = static_cast<std::uint32_t>(size), .id = message.id});
   Store(datagram.data() + kOneWayLengthOffset, static_cast<std::uint32_t>(length));
-  if (length > 0) {
-    std::memcpy(datagram.data() + kOneWayPayloadOffset, message.payload.data(), length);
-  }
+  datagram.insert(datagram.end(), message.payload.begin(), message.payload.end());
+  datagram.resize(size);
   return datagram;
 }
 
