@@ -116,10 +116,12 @@ TEST_F(Links, RemovalTakesAwayFilesAndEmptyDirectoriesButNoTree) {
       << outcome.errors;
 }
 
-/// Stores "old", then sets "new", which cannot be written: it is pending in the helper alone.
+/// Stores "old", then sets "new", which cannot be written: it is pending in the helper alone. That is
+/// another helper, because one that confines itself has looked at the mounts before.
 const std::string kPendingValue =
     "folder=/root/Library/Preferences; set='halvecctl preference set com.example.domain key'\n"
-    "$set old; mount --bind $folder $folder; mount -o remount,bind,ro $folder; $set new\n"
+    "$set old; handset kill KILL; handset wait-exit >/dev/null\n"
+    "mount --bind $folder $folder; mount -o remount,bind,ro $folder; $set new\n"
     "halvecctl preference get com.example.domain key\n";
 
 TEST_F(Links, WithADomainMakeTheHelperForgetWhatItHadInMemory) {
