@@ -116,8 +116,8 @@ TEST_F(Links, RemovalTakesAwayFilesAndEmptyDirectoriesButNoTree) {
       << outcome.errors;
 }
 
-/// Stores "old", then sets "new", which cannot be written: it is pending in the helper alone. That is
-/// another helper, because one that confines itself has looked at the mounts before.
+/// Stores "old", then sets "new", which cannot be written: it is pending in the helper alone. That
+/// is another helper, because one that confines itself has looked at the mounts before.
 const std::string kPendingValue =
     "folder=/root/Library/Preferences; set='halvecctl preference set com.example.domain key'\n"
     "$set old; handset kill KILL; handset wait-exit >/dev/null\n"
