@@ -7,6 +7,7 @@ asked exactly as a reverse look-up should be; the whole degrees of latitude say 
 """
 import http.server
 import json
+import os
 import select
 import ssl
 import sys
@@ -73,6 +74,7 @@ def main():
     print(server.server_address[1], flush=True)
     print(flush=True)
     sys.stdin.read()
+    os._exit(0)  # a thread may be in the TLS library, which exit() takes down under it
 
 
 if __name__ == "__main__":
