@@ -6,7 +6,6 @@
 #include <poll.h>
 #include <sys/ioctl.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 
 #include <cerrno>
 #include <cstring>
@@ -78,8 +77,10 @@ int SendPacket(int socket, const OutgoingPacket& packet, int flags) {
        {const_cast<std::byte*>(packet.behind.data()), packet.behind.size()}}};
   DescriptorBuffer control{};
   msghdr header{};
-  header.msg_name = const_cast<sockaddr_un*>(packet.destination);
-  header.msg_namelen = packet.destination == nullptr ? 0 : sizeof(sockaddr_un);
+  if (packet.destination != nullptr) {
+    header.msg_name = const_cast<sockaddr*>(packet.destination->get());
+    header.msg_namelen = packet.destination->size();
+  }
   header.msg_iov = parts.data();
   header.msg_iovlen = packet.behind.empty() ? 1 : 2;
   if (packet.descriptorCount != 0) {

@@ -12,8 +12,7 @@
 #include "Client/Deadline.h"
 #include "Client/Result.h"
 #include "Helper/Platform/FileDescriptor.h"
-
-struct sockaddr_un;
+#include "Helper/Platform/UnixSocketAddress.h"
 
 namespace halvec {
 
@@ -23,7 +22,7 @@ struct OutgoingPacket {
   std::span<const std::byte> behind;
   std::array<int, 2> descriptors{-1, -1};
   std::size_t descriptorCount = 0;
-  const sockaddr_un* destination = nullptr;  // null on a connected socket
+  const platform::UnixSocketAddress* destination = nullptr;  // null on a connected socket
 };
 
 /// Sends without waiting. Answers 0 or an errno; the packet is sent whole or not at all.

@@ -4,15 +4,14 @@
 #include "Client/ServiceConnection.h"
 
 #include <sys/socket.h>
-#include <sys/un.h>
 
 #include <array>
 #include <cerrno>
-#include <cstring>
 #include <utility>
 
 #include "Client/Deadline.h"
 #include "Client/Packet.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 #include "Helper/Shared/Interface/Connect.h"
 #include "Helper/Shared/Interface/Message.h"
 
@@ -20,6 +19,7 @@ namespace halvec {
 namespace {
 
 using platform::FileDescriptor;
+using platform::UnixSocketAddress;
 
 /// A helper that leaves this often while somebody connects is not about to stay.
 constexpr int kMaxAttempts = 10;
@@ -73,7 +73,8 @@ Error ErrorOfSend(int code) {
 }
 
 /// Sends `packet`; while the queue is full, waits for room until the deadline.
-Error SendToService(const sockaddr_un& address, OutgoingPacket packet, const Deadline& deadline) {
+Error SendToService(const UnixSocketAddress& address, OutgoingPacket packet,
+                    const Deadline& deadline) {
   const FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
   if (!socket) return Error::FromSystem(errno);
   // The kernel attests who sends only if one side asked for it before the message is queued.
@@ -94,8 +95,7 @@ Error SendToService(const sockaddr_un& address, OutgoingPacket packet, const Dea
     if (code != EAGAIN) return ErrorOfSend(code);
     // Only a connected socket can wait for room in the queue of another.
     if (packet.destination != nullptr) {
-      if (::connect(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) !=
-          0) {
+      if (::connect(socket.get(), address.get(), address.size()) != 0) {
         return ErrorOfSend(errno);
       }
       packet.destination = nullptr;
@@ -143,7 +143,7 @@ Error ReadConnectReply(const std::byte* reply, IncomingPacket& packet, FileDescr
 }
 
 /// One exchange. HVMH_HELPER_GONE when the helper left without an answer.
-Error ConnectOnce(const sockaddr_un& address, const Deadline& deadline,
+Error ConnectOnce(const UnixSocketAddress& address, const Deadline& deadline,
                   ServiceConnection& connection) {
   SocketPair own;
   SocketPair reply;
@@ -186,13 +186,8 @@ const std::string& DefaultServicePath() {
 
 Result<ServiceConnection> ConnectToService(const std::string& path,
                                            std::chrono::milliseconds limit) {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  if (path.empty() || path.size() >= sizeof address.sun_path ||
-      path.find('\0') != std::string::npos) {
-    return Error{HVMH_INVALID_ARGUMENT};
-  }
-  std::memcpy(address.sun_path, path.data(), path.size());
+  const UnixSocketAddress address(path);
+  if (!address) return Error{HVMH_INVALID_ARGUMENT};
 
   const Deadline deadline(limit);
   Error error;

@@ -4,7 +4,6 @@
 #include <fcntl.h>
 #include <sys/mman.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 
 #include <algorithm>
 #include <array>
@@ -12,9 +11,12 @@
 #include <cstring>
 
 #include "Benchmarks/Support/Measure.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 
 namespace bench {
 namespace {
+
+using platform::UnixSocketAddress;
 
 constexpr std::uint32_t kComplex = 0x80000000;
 constexpr std::uint32_t kReplyRight = 18;
@@ -43,14 +45,6 @@ void PutText(std::vector<std::byte>& message, std::size_t offset, const std::str
   std::memcpy(message.data() + offset, text.data(), std::min(text.size(), kSlot - 1));
 }
 
-sockaddr_un Address(const std::string& path) {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  std::memcpy(static_cast<char*>(address.sun_path), path.c_str(),
-              std::min(path.size(), sizeof address.sun_path - 1));
-  return address;
-}
-
 void AttestSender(int socket) {
   const int on = 1;
   Check(::setsockopt(socket, SOL_SOCKET, SO_PASSCRED, &on, sizeof on), "SO_PASSCRED");
@@ -68,8 +62,8 @@ FileDescriptor BindService(const std::string& path) {
   FileDescriptor socket(Check(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0), "socket"));
   AttestSender(socket.get());
   (void)::unlink(path.c_str());
-  const sockaddr_un address = Address(path);
-  Check(::bind(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), "bind");
+  const UnixSocketAddress address(path);
+  Check(::bind(socket.get(), address.get(), address.size()), "bind");
   return socket;
 }
 
@@ -77,11 +71,10 @@ bool SendWithDescriptors(int socket, std::span<const std::span<const std::byte>>
                          std::span<const int> descriptors, const std::string& path) {
   std::array<iovec, 2> vectors{};
   msghdr message{};
-  sockaddr_un address{};
-  if (!path.empty()) {
-    address = Address(path);
-    message.msg_name = &address;
-    message.msg_namelen = sizeof address;
+  const UnixSocketAddress address(path);
+  if (address) {
+    message.msg_name = const_cast<sockaddr*>(address.get());
+    message.msg_namelen = address.size();
   }
   message.msg_iov = vectors.data();
   for (const auto part : parts) {

@@ -1,14 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Benchmarks/Transport/BusDaemon.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 
 #include <fcntl.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 #include <systemd/sd-bus.h>
 #include <unistd.h>
 
 #include <array>
-#include <cstring>
 #include <fstream>
 
 namespace bench {
@@ -62,11 +61,9 @@ bool AddListener(sd_bus* bus, int listener) {
 FileDescriptor ListenAt(const std::string& path) {
   FileDescriptor socket(
       Check(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0), "socket"));
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  std::memcpy(static_cast<char*>(address.sun_path), path.c_str(), path.size() + 1);
+  const platform::UnixSocketAddress address(path);
   (void)::unlink(path.c_str());
-  Check(::bind(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), "bind");
+  Check(::bind(socket.get(), address.get(), address.size()), "bind");
   Check(::listen(socket.get(), SOMAXCONN), "listen");
   return socket;
 }

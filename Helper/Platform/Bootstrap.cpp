@@ -5,18 +5,17 @@
 #include <fcntl.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/un.h>
 
 #include <array>
 #include <cerrno>
 #include <charconv>
 #include <cstdlib>
-#include <cstring>
 #include <string_view>
 
 #include "Helper/Platform/Linux/LauncherNotice.h"
 #include "Helper/Platform/PortEntry.h"
 #include "Helper/Platform/ProcessIdentity.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 
 namespace platform {
 namespace {
@@ -79,22 +78,19 @@ KernReturn CodeOfErrno() {
 
 /// Binds the service's socket. A socket that nobody serves any more is replaced.
 KernReturn Bind(const std::string& path, PortEntry& entry) {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  if (path.size() >= sizeof address.sun_path) return KERN_INVALID_ARGUMENT;
-  std::memcpy(static_cast<char*>(address.sun_path), path.c_str(), path.size() + 1);
-  const auto* name = reinterpret_cast<const sockaddr*>(&address);
+  const UnixSocketAddress address(path);
+  if (!address) return KERN_INVALID_ARGUMENT;
 
   FileDescriptor probe(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
   if (!probe) return CodeOfErrno();
-  if (::connect(probe.get(), name, sizeof address) == 0) return KERN_NO_ACCESS;
+  if (::connect(probe.get(), address.get(), address.size()) == 0) return KERN_NO_ACCESS;
   if (errno == ECONNREFUSED) (void)::unlink(path.c_str());  // what matters is whether bind succeeds
 
   FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
   if (!socket || !AskForSenders(socket.get())) return CodeOfErrno();
   // Start-up has one thread, so the mask is nobody else's: mode 0660 from the first moment on.
   const mode_t mask = ::umask(S_IXUSR | S_IXGRP | S_IRWXO);
-  const bool bound = ::bind(socket.get(), name, sizeof address) == 0;
+  const bool bound = ::bind(socket.get(), address.get(), address.size()) == 0;
   const KernReturn code = errno == EADDRINUSE ? KERN_NO_ACCESS : CodeOfErrno();
   ::umask(mask);
   if (!bound) return code;

@@ -1,12 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Helper/Platform/GlobalQueue.h"
 
-#include <signal.h>
-
 #include <asio/executor_work_guard.hpp>
 #include <asio/io_context.hpp>
 #include <asio/post.hpp>
-#include <thread>
+
+#include "Helper/Platform/DetachedThread.h"
 
 namespace platform {
 namespace {
@@ -17,13 +16,7 @@ struct Queue {
   asio::executor_work_guard<asio::io_context::executor_type> work{context.get_executor()};
 
   Queue() {
-    // Signals are the main thread's affair.
-    sigset_t all;
-    sigset_t previous;
-    sigfillset(&all);
-    (void)pthread_sigmask(SIG_SETMASK, &all, &previous);
-    std::thread([this] { context.run(); }).detach();
-    (void)pthread_sigmask(SIG_SETMASK, &previous, nullptr);
+    StartDetachedThread([this] { context.run(); });
   }
 };
 

@@ -3,13 +3,12 @@
 
 #include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/un.h>
 #include <unistd.h>
 
-#include <cstring>
 #include <utility>
 
 #include "Helper/Platform/RunLoopCore.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 
 namespace platform {
 namespace {
@@ -18,15 +17,13 @@ constexpr int kBacklog = 8;
 
 /// A socket that listens at `path` for its owner and root alone; empty on failure.
 FileDescriptor Listen(const std::string& path) {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  if (path.empty() || path.size() >= sizeof address.sun_path) return {};
-  std::memcpy(address.sun_path, path.data(), path.size());
+  const UnixSocketAddress address(path);
+  if (!address) return {};
   FileDescriptor socket(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
   // The mode of the socket becomes the mode of its name.
   if (!socket || ::fchmod(socket.get(), S_IRUSR | S_IWUSR) != 0) return {};
   (void)::unlink(path.c_str());  // nothing there: nothing to replace
-  if (::bind(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0 ||
+  if (::bind(socket.get(), address.get(), address.size()) != 0 ||
       ::listen(socket.get(), kBacklog) != 0) {
     return {};
   }

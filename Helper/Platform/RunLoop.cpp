@@ -5,9 +5,9 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <climits>
 #include <utility>
 
+#include "Helper/Platform/PollTimeout.h"
 #include "Helper/Platform/RunLoopCore.h"
 
 namespace platform {
@@ -17,15 +17,6 @@ namespace {
 constexpr double kForeverSeconds = 100.0 * 366 * 86400;
 
 thread_local RunLoop* currentLoop = nullptr;
-
-/// As epoll_wait takes it: -1 waits for as long as nothing happens. Rounded up, so that a loop does
-/// not spin through the last millisecond.
-int MillisecondsUntil(TimePoint time) {
-  if (time == TimePoint::max()) return -1;
-  const auto left =
-      std::chrono::ceil<std::chrono::milliseconds>(time - std::chrono::steady_clock::now());
-  return static_cast<int>(std::clamp<std::int64_t>(left.count(), 0, INT_MAX));
-}
 
 class MonotonicClock final : public Clock {
  public:

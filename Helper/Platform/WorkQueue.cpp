@@ -2,7 +2,6 @@
 #include "Helper/Platform/WorkQueue.h"
 
 #include <pthread.h>
-#include <signal.h>
 #include <sys/prctl.h>
 
 #include <algorithm>
@@ -11,11 +10,11 @@
 #include <mutex>
 #include <semaphore>
 #include <system_error>
-#include <thread>
 #include <utility>
 #include <vector>
 
 #include "Helper/Platform/CurrentWork.h"
+#include "Helper/Platform/DetachedThread.h"
 
 namespace platform {
 
@@ -76,18 +75,12 @@ void WorkQueue::State::submit(Work item) {
 void WorkQueue::State::startThread() {
   changed.notify_one();
   if (threadRuns) return;
-  // Signals are the main thread's affair.
-  sigset_t all;
-  sigset_t previous;
-  sigfillset(&all);
-  (void)::pthread_sigmask(SIG_SETMASK, &all, &previous);
   try {
-    std::thread([self = shared_from_this()] { self->run(); }).detach();
+    StartDetachedThread([self = shared_from_this()] { self->run(); });
     threadRuns = true;
   } catch (const std::system_error&) {
     // No thread to be had now. The work stays, and the next submission tries again.
   }
-  (void)::pthread_sigmask(SIG_SETMASK, &previous, nullptr);
 }
 
 /// With `mutex` held. A tick takes its place behind the work that waits, so that a handler slower

@@ -7,7 +7,6 @@
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 #include <atomic>
@@ -15,6 +14,7 @@
 #include <string>
 
 #include "Client/HelperClient.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 #include "Tests/Client/FakeHelper.h"
 
 namespace {
@@ -236,14 +236,11 @@ TEST(Connect, TimesOutOnAServiceThatDoesNotAnswer) {
 
 /// Fills the queue of the service with other senders' messages.
 int FillQueue(const fake::Service& service) {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  service.path().copy(address.sun_path, sizeof address.sun_path - 1);
+  const platform::UnixSocketAddress address(service.path());
   int sent = 0;
   for (;; ++sent) {
     const fake::FileDescriptor sender(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-    if (::sendto(sender.get(), "x", 1, MSG_DONTWAIT, reinterpret_cast<sockaddr*>(&address),
-                 sizeof address) != 1) {
+    if (::sendto(sender.get(), "x", 1, MSG_DONTWAIT, address.get(), address.size()) != 1) {
       return sent;
     }
   }

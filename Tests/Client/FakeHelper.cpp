@@ -2,13 +2,13 @@
 //
 // Literal bytes and plain socket calls.
 #include "Tests/Client/FakeHelper.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <poll.h>
 #include <sys/mman.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -183,11 +183,8 @@ Service::~Service() {
 void Service::bind() {
   ::unlink(path_.c_str());
   socket_.reset(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  path_.copy(address.sun_path, sizeof address.sun_path - 1);
-  Require(::bind(socket_.get(), reinterpret_cast<sockaddr*>(&address), sizeof address) == 0,
-          "bind");
+  const platform::UnixSocketAddress address(path_);
+  Require(::bind(socket_.get(), address.get(), address.size()) == 0, "bind");
 }
 
 Connection Accept(int service) {

@@ -6,7 +6,6 @@
 #include <sys/mount.h>
 #include <sys/socket.h>
 #include <sys/sysmacros.h>
-#include <sys/un.h>
 #include <sys/xattr.h>
 
 #include <cerrno>
@@ -14,6 +13,7 @@
 #include <vector>
 
 #include "Helper/Platform/FileManager.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 #include "Tests/Files/FolderForTest.h"
 #include "Tests/Files/SmallFileSystem.h"
 #include "Tests/Support/WireClient.h"
@@ -127,10 +127,8 @@ TEST_F(FileManagerPosix, OpensNoSocketAndNoDevice) {
   folder.folder("tree");
   folder.file("tree/file", "text");
   const platform::FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  std::strncpy(address.sun_path, at("tree/socket").c_str(), sizeof address.sun_path - 1);
-  ASSERT_EQ(::bind(socket.get(), reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
+  const platform::UnixSocketAddress address(at("tree/socket"));
+  ASSERT_EQ(::bind(socket.get(), address.get(), address.size()), 0);
   // Opening a terminal that has no driver would answer ENXIO instead.
   if (::geteuid() == 0) ::mknod(at("tree/device").c_str(), S_IFCHR | 0644, makedev(250, 250));
   EXPECT_EQ(copy(at("tree"), at("copy")), EOPNOTSUPP);

@@ -5,13 +5,13 @@
 #include <gtest/gtest.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/un.h>
 
 #include <algorithm>
 #include <filesystem>
 #include <string>
 #include <vector>
 
+#include "Helper/Platform/UnixSocketAddress.h"
 #include "Tests/Client/FakeHelper.h"
 #include "Tests/Halvecctl/Answered.h"
 #include "Tests/Halvecctl/Program.h"
@@ -81,19 +81,12 @@ std::string PortPath(const fake::Service& service) {
   return service.path().substr(0, service.path().rfind('/')) + "/com.zarvo.Halvec.lasd";
 }
 
-sockaddr_un AddressOf(const std::string& path) {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  path.copy(static_cast<char*>(address.sun_path), sizeof address.sun_path - 1);
-  return address;
-}
-
 void Notify(const fake::Service& service, const Bytes& datagram) {
   const FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  const sockaddr_un address = AddressOf(PortPath(service));
-  EXPECT_EQ(::sendto(socket.get(), datagram.data(), datagram.size(), 0,
-                     reinterpret_cast<const sockaddr*>(&address), sizeof address),
-            static_cast<ssize_t>(datagram.size()));
+  const platform::UnixSocketAddress address(PortPath(service));
+  EXPECT_EQ(
+      ::sendto(socket.get(), datagram.data(), datagram.size(), 0, address.get(), address.size()),
+      static_cast<ssize_t>(datagram.size()));
 }
 
 /// Runs `lasd update --wait` with `options`, answers each trigger with 0 and then with the
@@ -175,8 +168,8 @@ TEST(LasdUpdateWait, EndsWhenTheHelperGoesAway) {
 TEST(LasdUpdateWait, LeavesAPortThatAnotherProgramHoldsAlone) {
   fake::Service service;
   const FileDescriptor daemon(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  const sockaddr_un address = AddressOf(PortPath(service));
-  ASSERT_EQ(::bind(daemon.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  const platform::UnixSocketAddress address(PortPath(service));
+  ASSERT_EQ(::bind(daemon.get(), address.get(), address.size()), 0);
   const Outcome outcome = RunProgram({"--service", service.path(), "lasd", "update", "--wait"});
   EXPECT_EQ(outcome.exitCode, 7);
   EXPECT_EQ(outcome.errors, "halvecctl: another program holds " + PortPath(service) +
@@ -188,8 +181,8 @@ TEST(LasdUpdateWait, TakesTheNameOfAProgramThatWasKilled) {
   fake::Service service;
   {
     const FileDescriptor killed(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-    const sockaddr_un address = AddressOf(PortPath(service));
-    ASSERT_EQ(::bind(killed.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+    const platform::UnixSocketAddress address(PortPath(service));
+    ASSERT_EQ(::bind(killed.get(), address.get(), address.size()), 0);
   }
   fake::Beside helper([&] {
     fake::Connection connection = fake::Accept(service.socket());

@@ -3,12 +3,12 @@
 // halvecctl location resolve and country against the helper's side of the wire in literal bytes.
 #include <gtest/gtest.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 
 #include <filesystem>
 #include <string>
 #include <vector>
 
+#include "Helper/Platform/UnixSocketAddress.h"
 #include "Tests/Client/FakeHelper.h"
 #include "Tests/Halvecctl/Answered.h"
 #include "Tests/Halvecctl/Program.h"
@@ -113,11 +113,8 @@ Bytes ConnectionRequest() {
 void SendToPort(const fake::Service& service, const Bytes& request,
                 const std::vector<int>& descriptors) {
   const FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  PortPath(service).copy(static_cast<char*>(address.sun_path), sizeof address.sun_path - 1);
-  ASSERT_EQ(::connect(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address),
-            0);
+  const platform::UnixSocketAddress address(PortPath(service));
+  ASSERT_EQ(::connect(socket.get(), address.get(), address.size()), 0);
   fake::Send(socket.get(), request, descriptors);
 }
 
@@ -203,10 +200,8 @@ TEST(LocationResolveWait, FailsWhenWhatComesIsNoConnectionRequest) {
 TEST(LocationResolveWait, SaysWhoHasThePortAndAsksNothing) {
   fake::Service service;
   const FileDescriptor daemon(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  PortPath(service).copy(static_cast<char*>(address.sun_path), sizeof address.sun_path - 1);
-  ASSERT_EQ(::bind(daemon.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  const platform::UnixSocketAddress address(PortPath(service));
+  ASSERT_EQ(::bind(daemon.get(), address.get(), address.size()), 0);
   const Outcome outcome =
       RunProgram({"--service", service.path(), "location", "resolve", "1", "2", "--wait"});
   EXPECT_EQ(outcome.exitCode, 7);

@@ -5,11 +5,11 @@
 #include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/un.h>
 
 #include <filesystem>
 #include <string>
 
+#include "Helper/Platform/UnixSocketAddress.h"
 #include "Tests/LASD/UpdaterFixture.h"
 
 namespace {
@@ -388,10 +388,8 @@ TEST_F(Install, TakesASocketForADirectoryUntilItWrites) {
   // Its type has the directory's bit.
   putDatabase(kUrl, "new");
   const platform::FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  folder.at("LASD").copy(static_cast<char*>(address.sun_path), sizeof address.sun_path - 1);
-  ASSERT_EQ(::bind(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  const platform::UnixSocketAddress address(folder.at("LASD"));
+  ASSERT_EQ(::bind(socket.get(), address.get(), address.size()), 0);
   EXPECT_FALSE(install(kUrl));
   EXPECT_EQ(lines().back(), "Failed to commit the data to file for " + path("gsm.db.tmp") + "\n");
 }

@@ -5,15 +5,14 @@
 
 #include <gtest/gtest.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 #include <cstddef>
-#include <cstring>
 #include <string>
 #include <vector>
 
 #include "Helper/Platform/FileDescriptor.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 
 namespace message_port_test {
 
@@ -21,12 +20,9 @@ class PublishedPort {
  public:
   explicit PublishedPort(std::string path, int type = SOCK_DGRAM)
       : path_(std::move(path)), socket_(::socket(AF_UNIX, type | SOCK_CLOEXEC, 0)) {
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    EXPECT_LT(path_.size(), sizeof address.sun_path);
-    std::memcpy(static_cast<char*>(address.sun_path), path_.c_str(), path_.size() + 1);
-    EXPECT_EQ(::bind(socket_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address),
-              0);
+    const platform::UnixSocketAddress address(path_);
+    EXPECT_TRUE(address);
+    EXPECT_EQ(::bind(socket_.get(), address.get(), address.size()), 0);
   }
   ~PublishedPort() { ::unlink(path_.c_str()); }
   PublishedPort(const PublishedPort&) = delete;

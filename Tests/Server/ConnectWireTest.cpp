@@ -2,8 +2,8 @@
 //
 // The connect message, byte for byte.
 #include <sys/socket.h>
-#include <sys/un.h>
 
+#include "Helper/Platform/UnixSocketAddress.h"
 #include "Helper/Shared/Server/ConnectSubsystem.h"
 #include "Tests/Support/ServerFixture.h"
 
@@ -130,10 +130,8 @@ TEST_F(ConnectWire, WithoutAClientPortGets5) {
   support::FileDescriptor sender(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
   const int on = 1;
   ::setsockopt(sender.get(), SOL_SOCKET, SO_PASSCRED, &on, sizeof on);
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  std::memcpy(address.sun_path, launcher.path().c_str(), launcher.path().size() + 1);
-  ASSERT_EQ(::connect(sender.get(), reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
+  const platform::UnixSocketAddress address(launcher.path());
+  ASSERT_EQ(::connect(sender.get(), address.get(), address.size()), 0);
   ASSERT_EQ(support::SendPacket(sender.get(), support::ConnectRequest(), {reply.send.get()}), 0);
   pump();
   EXPECT_EQ(support::ReceivePacket(reply.receive.get()).bytes, errorReply(5));

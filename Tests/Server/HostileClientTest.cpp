@@ -5,9 +5,9 @@
 #include <fcntl.h>
 #include <sys/mman.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 
 #include "Helper/Platform/Port.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 #include "Tests/Support/ServerFixture.h"
 
 namespace {
@@ -184,14 +184,11 @@ TEST_F(HostileClient, PassingAServicesSocketAsAReplyRightIsNotWrittenTo) {
   // A socket with an address belongs to a service that might believe our credentials.
   const support::FileDescriptor listener(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
   const std::string path = launcher.path() + ".other";
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  std::memcpy(address.sun_path, path.c_str(), path.size() + 1);
-  const auto* name = reinterpret_cast<const sockaddr*>(&address);
-  ASSERT_EQ(::bind(listener.get(), name, sizeof address), 0);
+  const platform::UnixSocketAddress address(path);
+  ASSERT_EQ(::bind(listener.get(), address.get(), address.size()), 0);
   ASSERT_EQ(::listen(listener.get(), 1), 0);
   const support::FileDescriptor socket(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
-  ASSERT_EQ(::connect(socket.get(), name, sizeof address), 0);
+  ASSERT_EQ(::connect(socket.get(), address.get(), address.size()), 0);
   ::unlink(path.c_str());
   const support::FileDescriptor accepted(::accept4(listener.get(), nullptr, nullptr, SOCK_CLOEXEC));
   Bytes bytes = support::Message(8683551, 24);

@@ -1,11 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // What an observer of the server receives, over a real socket, on a manual clock. One thread.
+#include "Helper/Platform/UnixSocketAddress.h"
 #include "Helper/Shared/Server/Observation.h"
 
 #include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 #include <filesystem>
@@ -36,11 +36,8 @@ class ObservationTest : public support::ServerFixture {
 
   [[nodiscard]] FileDescriptor connectObserver() {
     FileDescriptor socket(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    path().copy(address.sun_path, sizeof address.sun_path - 1);
-    EXPECT_EQ(::connect(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address),
-              0);
+    const platform::UnixSocketAddress address(path());
+    EXPECT_EQ(::connect(socket.get(), address.get(), address.size()), 0);
     pumpAll();
     return socket;
   }

@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Tests/Support/WireClient.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 
 #include <dirent.h>
 #include <poll.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 
 #include <array>
 #include <cerrno>
@@ -14,20 +14,17 @@
 namespace support {
 namespace {
 
-sockaddr_un AddressOf(const std::string& path) {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  std::memcpy(address.sun_path, path.c_str(), path.size() + 1);
-  return address;
-}
+using platform::UnixSocketAddress;
 
-int SendTo(int socket, const sockaddr_un* address, const Bytes& bytes,
+int SendTo(int socket, const UnixSocketAddress* address, const Bytes& bytes,
            const std::vector<int>& descriptors) {
   iovec part{.iov_base = const_cast<std::uint8_t*>(bytes.data()), .iov_len = bytes.size()};
   std::vector<std::byte> control(CMSG_SPACE(sizeof(int) * descriptors.size()));
   msghdr message{};
-  message.msg_name = const_cast<sockaddr_un*>(address);
-  message.msg_namelen = address ? sizeof *address : 0;
+  if (address) {
+    message.msg_name = const_cast<sockaddr*>(address->get());
+    message.msg_namelen = address->size();
+  }
   message.msg_iov = &part;
   message.msg_iovlen = 1;
   if (!descriptors.empty()) {
@@ -102,8 +99,8 @@ LauncherSocket::LauncherSocket(const std::string& serviceName, bool passCredenti
   socket_.reset(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
   const int on = passCredentials ? 1 : 0;
   ::setsockopt(socket_.get(), SOL_SOCKET, SO_PASSCRED, &on, sizeof on);
-  const sockaddr_un address = AddressOf(path_);
-  if (::bind(socket_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
+  const UnixSocketAddress address(path_);
+  if (::bind(socket_.get(), address.get(), address.size()) != 0) {
     throw std::runtime_error("bind failed");
   }
   // The helper takes the handed-over descriptor for itself; the launcher keeps another.
@@ -178,7 +175,7 @@ void WireClient::sendConnect(const Bytes& request, bool askForCredentials) {
   FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
   const int on = askForCredentials ? 1 : 0;
   ::setsockopt(socket.get(), SOL_SOCKET, SO_PASSCRED, &on, sizeof on);
-  const sockaddr_un address = AddressOf(servicePath_);
+  const UnixSocketAddress address(servicePath_);
   if (const int error =
           SendTo(socket.get(), &address, request, {reply.send.get(), own.send.get()})) {
     throw std::runtime_error(std::string("connect could not be sent: ") + std::strerror(error));

@@ -3,10 +3,10 @@
 // The journal's sender against a socket made by the test: the bytes of a line. One thread, and a
 // queue's.
 #include "Helper/Platform/Linux/SystemLogJournal.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 
 #include <gtest/gtest.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 
 #include <filesystem>
 
@@ -24,10 +24,8 @@ class Journal : public testing::Test {
     ASSERT_NE(::mkdtemp(name.data()), nullptr);
     folder = name;
     daemon.reset(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    path().copy(address.sun_path, sizeof address.sun_path - 1);
-    ASSERT_EQ(::bind(daemon.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+    const platform::UnixSocketAddress address(path());
+    ASSERT_EQ(::bind(daemon.get(), address.get(), address.size()), 0);
   }
   void TearDown() override { std::filesystem::remove_all(folder); }
 

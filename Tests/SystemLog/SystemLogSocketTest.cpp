@@ -3,10 +3,10 @@
 // The system log's sender against a log daemon's socket made by the test: the bytes of a line, and
 // what happens when the daemon does not read, goes away or comes back. One thread.
 #include "Helper/Platform/Linux/SystemLogSocket.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 
 #include <gtest/gtest.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 #include <ctime>
@@ -48,11 +48,9 @@ class SystemLogSocketTest : public testing::Test {
   // A log daemon that listens under `path`.
   [[nodiscard]] FileDescriptor daemon() const {
     FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    path.string().copy(address.sun_path, sizeof address.sun_path - 1);
+    const platform::UnixSocketAddress address(path.string());
     fs::remove(path);
-    EXPECT_EQ(::bind(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+    EXPECT_EQ(::bind(socket.get(), address.get(), address.size()), 0);
     return socket;
   }
 

@@ -6,33 +6,26 @@
 #include <poll.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <cstring>
-#include <limits>
 #include <system_error>
 
+#include "Helper/Platform/PollTimeout.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 #include "Helper/Shared/Interface/OneWayMessage.h"
 #include "Tools/halvecctl/Exit.h"
 
 namespace halvecctl {
 namespace {
 
+using platform::UnixSocketAddress;
+
 std::string PathBeside(const std::string& servicePath, const std::string& name) {
   const std::size_t slash = servicePath.rfind('/');
   return (slash == std::string::npos ? "" : servicePath.substr(0, slash + 1)) + name;
-}
-
-sockaddr_un AddressOf(const std::string& path) {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  if (path.size() >= sizeof address.sun_path) throw UsageFailure("the socket's path is too long");
-  std::memcpy(static_cast<char*>(address.sun_path), path.c_str(), path.size() + 1);
-  return address;
 }
 
 platform::FileDescriptor MakeSocket() {
@@ -42,21 +35,13 @@ platform::FileDescriptor MakeSocket() {
 }
 
 /// Removes the file that a killed program left; throws when somebody listens there.
-void ClearName(const std::string& path, const sockaddr_un& address) {
+void ClearName(const std::string& path, const UnixSocketAddress& address) {
   const platform::FileDescriptor probe = MakeSocket();
-  if (::connect(probe.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0) {
+  if (::connect(probe.get(), address.get(), address.size()) == 0) {
     throw Failure(ExitCode::kSystem,
                   "another program holds " + path + " and is told what happens; do without --wait");
   }
   if (errno == ECONNREFUSED) (void)::unlink(path.c_str());  // the bind decides
-}
-
-/// Milliseconds until `deadline` for poll(2), rounded up.
-int MillisecondsUntil(std::chrono::steady_clock::time_point deadline) {
-  using std::chrono::milliseconds;
-  const auto left =
-      std::chrono::ceil<milliseconds>(deadline - std::chrono::steady_clock::now()).count();
-  return static_cast<int>(std::clamp<milliseconds::rep>(left, 0, std::numeric_limits<int>::max()));
 }
 
 }  // namespace
@@ -65,7 +50,7 @@ void AwaitPacket(int socket, int helper, std::chrono::steady_clock::time_point d
   for (;;) {
     std::array<pollfd, 2> entries{{{.fd = socket, .events = POLLIN, .revents = 0},
                                    {.fd = helper, .events = 0, .revents = 0}}};
-    const int ready = ::poll(entries.data(), entries.size(), MillisecondsUntil(deadline));
+    const int ready = ::poll(entries.data(), entries.size(), platform::MillisecondsUntil(deadline));
     if (ready == 0) throw Failure(ExitCode::kLost, "nothing was told in time");
     if (ready < 0) continue;
     if (entries[0].revents != 0) return;
@@ -75,11 +60,11 @@ void AwaitPacket(int socket, int helper, std::chrono::steady_clock::time_point d
 
 PublishedPort::PublishedPort(const std::string& servicePath, const std::string& name)
     : path_(PathBeside(servicePath, name)), socket_(MakeSocket()) {
-  const sockaddr_un address = AddressOf(path_);
+  const UnixSocketAddress address(path_);
+  if (!address) throw UsageFailure("the socket's path is too long");
   ClearName(path_, address);
   const mode_t mask = ::umask(S_IXUSR | S_IXGRP | S_IRWXO);
-  const int result =
-      ::bind(socket_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address);
+  const int result = ::bind(socket_.get(), address.get(), address.size());
   const int error = errno;
   ::umask(mask);
   if (result != 0) {

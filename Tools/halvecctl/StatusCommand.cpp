@@ -4,7 +4,6 @@
 // helper keeps for root; no message is sent to the service, so neither starts it or keeps it alive.
 #include <poll.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 #include <unistd.h>
 
 #include <array>
@@ -19,6 +18,7 @@
 
 #include "Helper/Platform/FileDescriptor.h"
 #include "Helper/Platform/PropertyList.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 #include "Tools/halvecctl/Command.h"
 #include "Tools/halvecctl/Input.h"
 #include "Tools/halvecctl/Json.h"
@@ -37,13 +37,10 @@ FileDescriptor Observe(const std::string& path) {
   if (path.empty()) {
     throw Failure(ExitCode::kNotConnected, "this build's helper has no socket for observers");
   }
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  if (path.size() >= sizeof address.sun_path) throw UsageFailure("the socket's path is too long");
-  std::memcpy(address.sun_path, path.data(), path.size());
+  const platform::UnixSocketAddress address(path);
+  if (!address) throw UsageFailure("the socket's path is too long");
   FileDescriptor socket(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
-  if (!socket ||
-      ::connect(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
+  if (!socket || ::connect(socket.get(), address.get(), address.size()) != 0) {
     if (errno == ENOENT || errno == ECONNREFUSED) {
       throw Failure(ExitCode::kNotConnected, "the helper is not running");
     }

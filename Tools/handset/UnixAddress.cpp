@@ -4,35 +4,31 @@
 #include "Tools/handset/UnixAddress.h"
 
 #include <sys/socket.h>
-#include <sys/un.h>
 
-#include <cstring>
-
+#include "Helper/Platform/UnixSocketAddress.h"
 #include "Tools/handset/Failure.h"
 
 namespace handset {
 namespace {
 
-sockaddr_un AddressOf(const std::string& path) {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  if (path.size() >= sizeof address.sun_path) throw Failure(path + " is too long for a socket");
-  std::memcpy(static_cast<char*>(address.sun_path), path.data(), path.size());
+platform::UnixSocketAddress AddressOf(const std::string& path) {
+  const platform::UnixSocketAddress address(path);
+  if (!address) throw Failure(path + " is too long for a socket");
   return address;
 }
 
 }  // namespace
 
 void BindAt(int socket, const std::string& path) {
-  const sockaddr_un address = AddressOf(path);
-  if (bind(socket, reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
+  const auto address = AddressOf(path);
+  if (bind(socket, address.get(), address.size()) != 0) {
     throw Failure::FromErrno("bind " + path);
   }
 }
 
 void ConnectTo(int socket, const std::string& path) {
-  const sockaddr_un address = AddressOf(path);
-  if (connect(socket, reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
+  const auto address = AddressOf(path);
+  if (connect(socket, address.get(), address.size()) != 0) {
     throw Failure::FromErrno("connect to " + path);
   }
 }

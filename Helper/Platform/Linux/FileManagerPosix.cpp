@@ -4,7 +4,6 @@
 // state.
 #include <fcntl.h>
 #include <grp.h>
-#include <pwd.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -16,6 +15,7 @@
 #include "Helper/Platform/FileManager.h"
 #include "Helper/Platform/Linux/FileLocation.h"
 #include "Helper/Platform/Linux/TreeCopy.h"
+#include "Helper/Platform/UserDatabase.h"
 
 namespace platform {
 namespace {
@@ -36,15 +36,13 @@ struct Ids {
 int ResolveIds(const FileAttributes& attributes, Ids& ids) {
   if (attributes.ownerId) ids.owner = *attributes.ownerId;
   if (attributes.groupId) ids.group = *attributes.groupId;
-  std::array<char, 16 * 1024> buffer;
   if (!attributes.ownerName.empty()) {
-    passwd entry{};
-    passwd* found = nullptr;
-    (void)::getpwnam_r(attributes.ownerName.c_str(), &entry, buffer.data(), buffer.size(), &found);
-    if (!found) return EINVAL;
-    ids.owner = found->pw_uid;
+    const auto account = Shared<UserDatabase>().ids(attributes.ownerName.c_str());
+    if (!account) return EINVAL;
+    ids.owner = account->user;
   }
   if (!attributes.groupName.empty()) {
+    std::array<char, 16 * 1024> buffer;
     group entry{};
     group* found = nullptr;
     (void)::getgrnam_r(attributes.groupName.c_str(), &entry, buffer.data(), buffer.size(), &found);

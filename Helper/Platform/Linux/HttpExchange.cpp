@@ -8,6 +8,7 @@
 #include <utility>
 
 #include "Helper/Platform/Linux/NetworkLinks.h"
+#include "Helper/Platform/PollTimeout.h"
 
 namespace platform {
 
@@ -24,12 +25,8 @@ bool AsksForGzip(const vlu::Http::HeaderMap::value_type& field) {
   return ::strcasecmp(field.first.c_str(), kAcceptEncoding) == 0 && field.second == "gzip";
 }
 
-/// At least one: zero would mean that there is no limit.
-long MillisecondsUntil(TimePoint deadline) {
-  const auto left =
-      std::chrono::ceil<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
-  return std::max(1L, static_cast<long>(left.count()));
-}
+/// The time left as the library takes it, at least one millisecond: zero would mean no limit.
+long LimitOf(TimePoint deadline) { return std::max(1, MillisecondsUntil(deadline)); }
 
 }  // namespace
 
@@ -106,8 +103,8 @@ ErrorType HttpExchange::keepOffCellular(const HttpTarget& target, TimePoint dead
 }
 
 void HttpExchange::setLimits(TimePoint connected, TimePoint deadline) {
-  set(CURLOPT_CONNECTTIMEOUT_MS, MillisecondsUntil(connected));
-  set(CURLOPT_TIMEOUT_MS, MillisecondsUntil(deadline));
+  set(CURLOPT_CONNECTTIMEOUT_MS, LimitOf(connected));
+  set(CURLOPT_TIMEOUT_MS, LimitOf(deadline));
   set(CURLOPT_LOW_SPEED_LIMIT, profile_.slowestRate);
   set(CURLOPT_LOW_SPEED_TIME, static_cast<long>(profile_.quietLimit.count()));
   set(CURLOPT_MAXFILESIZE_LARGE, static_cast<curl_off_t>(profile_.longestBody));

@@ -19,6 +19,7 @@
 #include "Helper/Platform/FileDescriptor.h"
 #include "Helper/Platform/Linux/DnsMessage.h"
 #include "Helper/Platform/Linux/NetworkLinks.h"
+#include "Helper/Platform/PollTimeout.h"
 #include "Helper/Platform/RegularFile.h"
 
 namespace platform {
@@ -112,11 +113,10 @@ std::vector<SocketAddress> Servers(const ResolverProfile& profile) {
 /// Waits until `socket` is ready for `events` or in error; false when the deadline comes first.
 bool WaitFor(const FileDescriptor& socket, short events, TimePoint deadline) {
   for (;;) {
-    const auto left =
-        std::chrono::ceil<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
-    if (left.count() <= 0) return false;
+    const int left = MillisecondsUntil(deadline);
+    if (left <= 0) return false;
     pollfd waited{socket.get(), events, 0};
-    const int ready = ::poll(&waited, 1, static_cast<int>(left.count()));
+    const int ready = ::poll(&waited, 1, left);
     if (ready > 0) return true;
     if (ready < 0 && errno != EINTR) return false;
   }

@@ -1,14 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Helper/Platform/Linux/LogSocket.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 
 #include <poll.h>
 #include <sys/socket.h>
 #include <sys/uio.h>
-#include <sys/un.h>
 
 #include <array>
 #include <cerrno>
-#include <cstring>
 
 namespace platform {
 namespace {
@@ -21,15 +20,12 @@ bool IsFull(int error) { return error == EAGAIN || error == EWOULDBLOCK || error
 }  // namespace
 
 bool LogSocket::connect() {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  if (path_.size() >= sizeof address.sun_path) return false;
-  std::memcpy(address.sun_path, path_.data(), path_.size());
+  const UnixSocketAddress address(path_);
+  if (!address) return false;
   // The socket is kept where no daemon listens: making one anew for every lost line would cost more
   // than the line.
   if (!socket_) socket_.reset(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  connected_ = socket_ && ::connect(socket_.get(), reinterpret_cast<const sockaddr*>(&address),
-                                    sizeof address) == 0;
+  connected_ = socket_ && ::connect(socket_.get(), address.get(), address.size()) == 0;
   return connected_;
 }
 

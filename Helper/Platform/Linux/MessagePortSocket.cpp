@@ -2,13 +2,12 @@
 //
 // The sending side of named message ports, and the provider that uses those of this system.
 #include "Helper/Platform/Linux/MessagePortSocket.h"
+#include "Helper/Platform/UnixSocketAddress.h"
 
 #include <fcntl.h>
 #include <sys/socket.h>
-#include <sys/un.h>
 
 #include <cerrno>
-#include <cstring>
 #include <vector>
 
 #include "Helper/Shared/Interface/OneWayMessage.h"
@@ -42,11 +41,8 @@ bool IsPortName(const std::string& name) {
 
 /// Connects to the socket file that `file` names, whatever stands at its path by now.
 bool ConnectToFile(int socket, int file) {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  const std::string path = "/proc/self/fd/" + std::to_string(file);
-  std::memcpy(static_cast<char*>(address.sun_path), path.c_str(), path.size() + 1);
-  return ::connect(socket, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
+  const UnixSocketAddress address("/proc/self/fd/" + std::to_string(file));
+  return ::connect(socket, address.get(), address.size()) == 0;
 }
 
 }  // namespace

@@ -6,7 +6,6 @@
 #include <poll.h>
 #include <sys/socket.h>
 
-#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstring>
@@ -15,6 +14,7 @@
 #include "Helper/Platform/FileDescriptor.h"
 #include "Helper/Platform/HandsetError.h"
 #include "Helper/Platform/Linux/MessagePortSocket.h"
+#include "Helper/Platform/PollTimeout.h"
 #include "Helper/Platform/PropertyList.h"
 #include "Helper/Shared/Interface/TelephonyConnection.h"
 
@@ -35,13 +35,6 @@ PropertyList::Dictionary CivicInfo(const CivicInfoTexts& texts) {
     if (texts[index]) info.set(wire::kCivicInfoKeys[index], texts[index]->utf8());
   }
   return info;
-}
-
-/// Rounded up, so that the last millisecond is not spent polling.
-int MillisecondsUntil(TimePoint deadline) {
-  const auto left =
-      std::chrono::ceil<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
-  return static_cast<int>(std::max<std::int64_t>(left.count(), 0));
 }
 
 class Connection final : public TelephonyConnection {
