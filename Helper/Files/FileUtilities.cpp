@@ -114,7 +114,8 @@ std::int32_t CopyOrMoveItem(const char* source, const char* destination, std::ui
       return error.value_or(kFileFailedWithoutError);
     }
     case FileKind::kDirectory:
-      to += '/' + BaseNameOf(source);
+      // A name that cannot be decoded leads nowhere, so that nothing is removed for its sake.
+      to = PathOf((to + '/' + BaseNameOf(source)).c_str());
       // What cannot be removed makes the merge fail, which is not reported.
       if (manager.kind(to) == FileKind::kOther) (void)manager.removeItem(to, nullptr);
       break;

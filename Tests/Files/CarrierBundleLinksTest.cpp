@@ -4,10 +4,12 @@
 #include "Helper/Files/MobileUser.h"
 #include "Tests/Fakes/FakeDirectoryEntries.h"
 #include "Tests/Fakes/FakePreferencesStore.h"
+#include "Tests/Files/PathRefusal.h"
 #include "Tests/Support/ServerFixture.h"
 
 namespace {
 
+using files_test::RefusalOf;
 using platform::LogPriority;
 using platform::PreferenceDomain;
 using platform::UserScope;
@@ -19,11 +21,6 @@ constexpr char kLibrary[] = "/private/var/mobile/Library";
 constexpr char kBundle[] = "/private/var/mobile/Library/Carrier Bundle.bundle";
 constexpr char kBundles[] = "/private/var/mobile/Library/Carrier Bundles";
 constexpr char kDomain[] = "com.zarvo.carrier";
-
-std::string UserBundles() {
-  const char* home = GetMobileUserDirectory();
-  return std::string(home ? home : "") + "/Library/Carrier Bundles/";
-}
 
 class CarrierBundleLinks : public support::ServerFixture {
  protected:
@@ -57,12 +54,6 @@ class CarrierBundleLinks : public support::ServerFixture {
   /// A pending change is part of the cached copy, and goes with it.
   bool isFlushed(UserScope user = UserScope::kAnyUser) {
     return !store.copyValue("key", PreferenceDomain{.identifier = kDomain, .user = user});
-  }
-  static Lines refusal(const std::string& path) {
-    return {{LogPriority::kError,
-             "NOT Allowing path " + path + " as it isn't within the wild card directories:"},
-            {LogPriority::kError, UserBundles()},
-            {LogPriority::kError, kBundles}};
   }
 
   fakes::FakePreferencesStore store;
@@ -193,7 +184,7 @@ TEST_F(CarrierBundleLinks, RemoveOfARefusedPathStillLogsAndFlushesTheDomainThenA
   EXPECT_TRUE(isFlushed());
   EXPECT_TRUE(entries.contains("/etc/passwd"));
   Lines expected{{LogPriority::kNotice, "Removing domain: com.zarvo.carrier\n"}};
-  const Lines refused = refusal("/etc/passwd");
+  const Lines refused = RefusalOf("/etc/passwd");
   expected.insert(expected.end(), refused.begin(), refused.end());
   EXPECT_EQ(log.takeLines(), expected);
 }
@@ -201,7 +192,7 @@ TEST_F(CarrierBundleLinks, RemoveOfARefusedPathStillLogsAndFlushesTheDomainThenA
 TEST_F(CarrierBundleLinks, RemoveWithoutADomainLogsAndFlushesNone) {
   EXPECT_EQ(removeLink("/etc/passwd", ""), 8);
   EXPECT_FALSE(isFlushed());
-  EXPECT_EQ(log.takeLines(), refusal("/etc/passwd"));
+  EXPECT_EQ(log.takeLines(), RefusalOf("/etc/passwd"));
 }
 
 TEST_F(CarrierBundleLinks, RemoveWithADomainThatIsNotUtf8LogsItAndFlushesNothing) {
@@ -227,7 +218,7 @@ TEST_F(CarrierBundleLinks, RemoveOfAPackageBelowTmpAnswers0AfterTheThreeErrorLin
   entries.put("/tmp/update.tcbk", S_IFREG | 0644);
   EXPECT_EQ(removeLink("/tmp/update.tcbk", ""), 0);
   EXPECT_FALSE(entries.contains("/tmp/update.tcbk"));
-  EXPECT_EQ(log.takeLines(), refusal("/tmp/update.tcbk"));
+  EXPECT_EQ(log.takeLines(), RefusalOf("/tmp/update.tcbk"));
 }
 
 TEST_F(CarrierBundleLinks, ReadAFieldWithoutItsZeroAsItsFirst1023Bytes) {
@@ -238,10 +229,17 @@ TEST_F(CarrierBundleLinks, ReadAFieldWithoutItsZeroAsItsFirst1023Bytes) {
   EXPECT_EQ(setLink(full, full, full), 8);
   EXPECT_EQ(log.takeLines(),
             (Lines{{LogPriority::kError, "Cannot remove symlink: " + full.substr(0, 1023)}}));
+  EXPECT_EQ(setLink(full, kBundle, full), 0);
+  EXPECT_EQ(entries.linkAt(kBundle), full.substr(0, 1023));
+  EXPECT_EQ(
+      log.takeLines().back(),
+      (fakes::FakeSystemLog::Line{LogPriority::kInfo, std::string("linkpath: ") + kBundle +
+                                                          ", domain: " + full.substr(0, 1023)}));
   EXPECT_EQ(removeLink(full, full), 8);
-  EXPECT_EQ(log.takeLines().front(),
-            (fakes::FakeSystemLog::Line{LogPriority::kNotice,
-                                        "Removing domain: " + full.substr(0, 1023) + "\n"}));
+  Lines removal = RefusalOf(full.substr(0, 1023));
+  removal.insert(removal.begin(),
+                 {LogPriority::kNotice, "Removing domain: " + full.substr(0, 1023) + "\n"});
+  EXPECT_EQ(log.takeLines(), removal);
 }
 
 }  // namespace

@@ -33,10 +33,10 @@ TEST_F(CopyFile, IntoANewBundleDirectoryGivesTheCopyToTheMobileUserAndTheSourceT
 
 TEST_F(CopyFile, OutsideEveryAllowedPlaceTouchesNothing) {
   const Outcome outcome =
-      run("mkdir /tmp/s; echo text >/tmp/s/f; ls -d /etc/new 2>/dev/null\n"
+      run("mkdir /tmp/s; echo text >/tmp/s/f; chown mobile /tmp/s/f\n"
           "halvecctl call CopyFile /tmp/s /etc/new f >/dev/null 2>&1; echo $?\n"
-          "ls -d /etc/new 2>/dev/null; handset log | grep 'Destination'");
-  EXPECT_TRUE(outcome.output.starts_with("1\n")) << outcome.output << outcome.errors;
+          "ls -d /etc/new 2>/dev/null; stat -c %U /tmp/s/f; handset log | grep 'Destination'");
+  EXPECT_TRUE(outcome.output.starts_with("1\nmobile\n")) << outcome.output << outcome.errors;
   EXPECT_NE(
       outcome.output.find("Destination directory /etc/new/f is not within the allowed directories"),
       std::string::npos)
@@ -52,6 +52,18 @@ TEST_F(CopyFile, ThatIsALinkGivesTheFileBehindItToTheMobileUserAndNotTheLink) {
           "'/var/mobile/Library/Carrier Bundles' $name >/dev/null 2>&1; echo $?; done\n"
           "stat -c '%F %U' '/var/mobile/Library/Carrier Bundles/f' /tmp/behind");
   EXPECT_EQ(outcome.output, "0\n1\nsymbolic link root\nregular file mobile\n") << outcome.errors;
+}
+
+TEST_F(CopyFile, ThatIsALinkToWhatIsOnlyBesideItsSourceStaysButFailsWithoutALine) {
+  const Outcome outcome =
+      run(kHome +
+          "mkdir /tmp/s; echo text >/tmp/s/beside; ln -s beside /tmp/s/f\n"
+          "halvecctl call CopyFile /tmp/s '/var/mobile/Library/Carrier Bundles' f >/dev/null 2>&1\n"
+          "echo $?; readlink '/var/mobile/Library/Carrier Bundles/f'" +
+          kLog);
+  EXPECT_EQ(outcome.output,
+            "1\nbeside\n" + Line(5, "'/tmp/s', '/var/mobile/Library/Carrier Bundles', 'f'"))
+      << outcome.errors;
 }
 
 TEST_F(CopyFile, LeavesNothingOfAKillWhenTheNextCopyIsDone) {

@@ -4,6 +4,7 @@
 // of the machine that runs the tests need not know the mobile user: what the home is, is asked.
 #include "Helper/Files/MobileUser.h"
 #include "Tests/Fakes/FakeFileManager.h"
+#include "Tests/Files/PathRefusal.h"
 #include "Tests/Support/ServerFixture.h"
 
 namespace {
@@ -46,16 +47,20 @@ class CopyAndMove : public support::ServerFixture {
     EXPECT_EQ(Get<std::int32_t>(reply, 32), 0) << "the return code is always 0";
     return Get<std::uint32_t>(reply, 36);
   }
-  /// What was logged, the allow-list's own lines left out.
+  /// What was logged, the lines of a path that the allow-list lets through left out.
   Lines lines() {
-    Lines kept;
-    for (Line& line : log.takeLines()) {
-      if (line.second.starts_with("'") || line.second.starts_with("Destination directory ") ||
-          line.second.starts_with("Failed to ")) {
-        kept.push_back(std::move(line));
-      }
-    }
+    Lines kept = log.takeLines();
+    std::erase_if(kept, [](const Line& line) { return line.second.starts_with("Allowing path "); });
     return kept;
+  }
+
+  /// The lines of a request that is refused: `before`, the allow-list's, the request's own.
+  static Lines aroundRefusalOf(const std::string& path, Lines before) {
+    const Lines refusal = files_test::RefusalOf(path);
+    before.insert(before.end(), refusal.begin(), refusal.end());
+    before.emplace_back(LogPriority::kError, "Destination directory " + path +
+                                                 " is not within the allowed directories\n");
+    return before;
   }
 
   const std::string bundles = Home() + "/Library/Carrier Bundles";
@@ -77,13 +82,13 @@ TEST_F(CopyAndMove, CopyAFileIntoANewDirectoryAmongTheCarrierBundles) {
 }
 
 TEST_F(CopyAndMove, CopyNoFileOutsideEveryAllowedPlaceAndTouchNothing) {
+  files.nodes["/source/file"].uid = 99;
   const auto before = files.nodes.size();
   EXPECT_EQ(send(kCopyFile, {"/source", "/etc", "file"}), 0U);
-  EXPECT_EQ(lines(), (Lines{{LogPriority::kNotice, "'/source', '/etc', 'file'\n"},
-                            {LogPriority::kError,
-                             "Destination directory /etc/file is not within the "
-                             "allowed directories\n"}}));
+  EXPECT_EQ(lines(),
+            aroundRefusalOf("/etc/file", {{LogPriority::kNotice, "'/source', '/etc', 'file'\n"}}));
   EXPECT_EQ(files.nodes.size(), before);
+  EXPECT_EQ(files.nodes["/source/file"].uid, 99U) << "nor is the source given away";
 }
 
 TEST_F(CopyAndMove, NameTheTwoDirectoriesWhenTheFileDoesNotExist) {
@@ -105,7 +110,7 @@ TEST_F(CopyAndMove, KeepTheCopyButFailWithoutALineWhenTheOwnerCannotBeChanged) {
   files.addDirectory(bundles + "/file");
   files.failAt(bundles + "/file", 71);
   EXPECT_EQ(send(kCopyFile, {"/source", bundles, "file"}), 0U);
-  EXPECT_EQ(lines().size(), 1U);
+  EXPECT_EQ(lines(), (Lines{{LogPriority::kNotice, "'/source', '" + bundles + "', 'file'\n"}}));
   EXPECT_EQ(files.contentOf(bundles + "/file/file"), "text");
 }
 
@@ -126,11 +131,12 @@ TEST_F(CopyAndMove, GiveWhatALinkPointsToToTheMobileUser) {
   EXPECT_EQ(files.nodes["/elsewhere"].uid, GetMobileUserUID());
 }
 
-TEST_F(CopyAndMove, KeepALinkToNothingButFailWithoutALine) {
+TEST_F(CopyAndMove, FailToCopyALinkToNothing) {
   files.addLink("/source/link", "/elsewhere");
-  files.addFile("/elsewhere", "text");
-  (void)files.removeItem("/elsewhere", nullptr);
   EXPECT_EQ(send(kCopyFile, {"/source", bundles, "link"}), 0U);
+  EXPECT_EQ(lines().back(),
+            (Line{LogPriority::kError, "Failed to copy the file /source to " + bundles + "\n"}));
+  EXPECT_FALSE(files.nodes.contains(bundles + "/link"));
 }
 
 TEST_F(CopyAndMove, ReadAFieldWithoutItsZeroAs255Bytes) {
@@ -156,19 +162,20 @@ TEST_F(CopyAndMove, LogMinus1AtNoticeWhenTheCrashLogsDoNotExist) {
 
 TEST_F(CopyAndMove, MoveABundleToTmpUnderTheWildcardRule) {
   EXPECT_EQ(send(kMoveCarrierBundles, {"/source", "/tmp", "x.tcbk"}), 1U);
-  EXPECT_EQ(lines(), (Lines{{LogPriority::kNotice, "'/source', '/tmp'\n"},
-                            {LogPriority::kNotice, "'/source', '/tmp', 'x.tcbk'\n"}}));
+  Lines expected{{LogPriority::kNotice, "'/source', '/tmp'\n"},
+                 {LogPriority::kNotice, "'/source', '/tmp', 'x.tcbk'\n"}};
+  const Lines refusal = files_test::RefusalOf("/tmp/x.tcbk");  // written before the rule is tried
+  expected.insert(expected.end(), refusal.begin(), refusal.end());
+  EXPECT_EQ(lines(), expected);
   EXPECT_EQ(files.contentOf("/tmp/x.tcbk/file"), "text");
   EXPECT_FALSE(files.nodes.contains("/source"));
 }
 
 TEST_F(CopyAndMove, MakeTheDirectoryOfABundleThatIsThenRefused) {
   EXPECT_EQ(send(kMoveCarrierBundles, {"/source", "/srv/new", "x"}), 0U);
-  EXPECT_EQ(lines(), (Lines{{LogPriority::kNotice, "'/source', '/srv/new'\n"},
-                            {LogPriority::kNotice, "'/source', '/srv/new', 'x'\n"},
-                            {LogPriority::kError,
-                             "Destination directory /srv/new/x is not within the "
-                             "allowed directories\n"}}));
+  EXPECT_EQ(lines(), aroundRefusalOf("/srv/new/x",
+                                     {{LogPriority::kNotice, "'/source', '/srv/new'\n"},
+                                      {LogPriority::kNotice, "'/source', '/srv/new', 'x'\n"}}));
   EXPECT_EQ(files.nodes["/srv/new"].mode, 0040755U);
   EXPECT_TRUE(files.nodes.contains("/source"));
 }

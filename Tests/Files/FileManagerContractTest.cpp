@@ -76,6 +76,8 @@ TYPED_TEST(FileManagerContract, TellsDirectoriesFromFilesAndFromNothing) {
   EXPECT_EQ(this->kind("file"), FileKind::kOther);
   EXPECT_EQ(this->kind("folder"), FileKind::kDirectory);
   EXPECT_EQ(this->kind("folder/"), FileKind::kDirectory);
+  EXPECT_EQ(this->kind("file//"), FileKind::kOther) << "a slash demands no directory";
+  EXPECT_EQ(this->manager().kind("/"), FileKind::kDirectory);
   EXPECT_EQ(this->kind("none"), FileKind::kAbsent);
   EXPECT_EQ(this->kind("none/none"), FileKind::kAbsent);
 }

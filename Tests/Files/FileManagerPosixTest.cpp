@@ -202,6 +202,27 @@ TEST_F(FileManagerPosix, LeavesNothingOfATreeThatDoesNotFitOnAFullDisk) {
   EXPECT_EQ(folder.text("tree/a"), "fits");
 }
 
+TEST_F(FileManagerPosix, LeavesOutAFileAloneWhoseAttributesHaveNoRoomThere) {
+  folder.folder("tree");
+  folder.folder("small");
+  const SmallFileSystem source(at("tree"));
+  // Attributes take their room from that for items, of which there is little: content fits.
+  const SmallFileSystem small(at("small"), "size=256k,nr_inodes=8");
+  if (!source || !small) {
+    GTEST_SKIP() << "no file system can be mounted here: " << std::strerror(errno);
+  }
+  folder.file("tree/a", "large");
+  folder.file("tree/b", "ordinary");
+  const std::string value(9000, 'x');
+  if (::setxattr(at("tree/a").c_str(), "user.large", value.data(), value.size(), 0) != 0) {
+    GTEST_SKIP() << "this kernel keeps no attributes in memory: " << std::strerror(errno);
+  }
+  EXPECT_EQ(copy(at("tree"), at("small/copy")), E2BIG);
+  EXPECT_EQ(manager.subpaths(at("small/copy")), (std::vector<std::string>{"b"}));
+  EXPECT_EQ(copy(at("tree/a"), at("small/a")), E2BIG);
+  EXPECT_EQ(manager.kind(at("small/a")), FileKind::kAbsent);
+}
+
 TEST_F(FileManagerPosix, MovesToAnotherFileSystemAllOrNothing) {
   folder.folder("other");
   const SmallFileSystem other(at("other"));

@@ -70,6 +70,13 @@ TEST_F(FileUtilities, Answer5ToAttributesForAMissingPath) {
   EXPECT_EQ(SetAttributesRecursively("/none", {}), 5);
 }
 
+TEST_F(FileUtilities, RemoveNothingForASourceWhoseNameCannotBeDecoded) {
+  files.addFile("/\xff", "new");
+  files.addFile("/to/\xff", "old");
+  EXPECT_EQ(CopyDirectory("/\xff", "/to"), 0) << "what a merge achieves is not reported";
+  EXPECT_EQ(files.contentOf("/to/\xff"), "old");
+}
+
 TEST_F(FileUtilities, SetAttributesOnATreeAndItsTop) {
   files.addDirectory("/from/sub");
   files.addFile("/from/sub/file", "x");

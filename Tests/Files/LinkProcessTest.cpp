@@ -55,6 +55,17 @@ TEST_F(Links, FollowTheHomeThatTheUserDatabaseGaveAtTheStart) {
       << outcome.errors;
 }
 
+TEST_F(Links, FollowTheHomeOfTheStartEvenWhenTheFirstIsMadeAfterAChange) {
+  const Outcome outcome =
+      run("mkdir -p /tmp/home/Library /var/mobile/Library; client connect\n"
+          "sed -i 's#:/var/mobile:#:/tmp/home:#' /etc/passwd\n"
+          "for home in /var/mobile /tmp/home; do\n"
+          "  halvecctl call SetCarrierBundleLink t $home/Library/CarrierDefault.bundle ''\n"
+          "done");
+  EXPECT_EQ(outcome.output, "0\ncode 0 (KERN_SUCCESS)\ncode 8 (KERN_NO_ACCESS)\n")
+      << outcome.errors;
+}
+
 TEST_F(Links, WithoutAMobileUserGoBelowTheRoot) {
   const Outcome outcome =
       run("sed -i '/^mobile:/d' /etc/passwd; halvecctl path explain /Library/Carrier\\ Bundles/x\n"

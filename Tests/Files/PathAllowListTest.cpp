@@ -12,28 +12,20 @@
 #include "Helper/Files/MobileUser.h"
 #include "Tests/Fakes/FakeDirectoryEntries.h"
 #include "Tests/Fakes/FakeSystemLog.h"
+#include "Tests/Files/PathRefusal.h"
 
 namespace {
 
+using files_test::kSystemBundles;
+using files_test::RefusalOf;
+using files_test::UserBundles;
 using platform::LogPriority;
 using Lines = std::vector<fakes::FakeSystemLog::Line>;
 
-constexpr char kSystemBundles[] = "/private/var/mobile/Library/Carrier Bundles";
 constexpr char kBundle[] = "/private/var/mobile/Library/Carrier Bundle.bundle";
-
-std::string UserBundles() {
-  const char* home = GetMobileUserDirectory();
-  return std::string(home ? home : "") + "/Library/Carrier Bundles/";
-}
 
 class PathAllowList : public ::testing::Test {
  protected:
-  static Lines refusal(const std::string& path) {
-    return {{LogPriority::kError,
-             "NOT Allowing path " + path + " as it isn't within the wild card directories:"},
-            {LogPriority::kError, UserBundles()},
-            {LogPriority::kError, kSystemBundles}};
-  }
   fakes::FakeSystemLog log;
   platform::ScopedReplacement<platform::SystemLog> logReplacement{log};
   fakes::FakeDirectoryEntries entries;
@@ -81,14 +73,14 @@ TEST_F(PathAllowList, LogsTheEntryThatAllowsAPath) {
 
 TEST_F(PathAllowList, LogsThreeErrorLinesWhenItRefusesAPath) {
   EXPECT_FALSE(IsAllowedPath("/etc/passwd"));
-  EXPECT_EQ(log.takeLines(), refusal("/etc/passwd"));
+  EXPECT_EQ(log.takeLines(), RefusalOf("/etc/passwd"));
   EXPECT_FALSE(IsAllowedPath(""));
-  EXPECT_EQ(log.takeLines(), refusal(""));
+  EXPECT_EQ(log.takeLines(), RefusalOf(""));
 }
 
 TEST_F(PathAllowList, LogsTheSameThreeLinesWhenItAllowsAPackage) {
   EXPECT_TRUE(IsAllowedPath("/tmp/update.tcbk"));
-  EXPECT_EQ(log.takeLines(), refusal("/tmp/update.tcbk"));
+  EXPECT_EQ(log.takeLines(), RefusalOf("/tmp/update.tcbk"));
 }
 
 TEST_F(PathAllowList, ChangesNothingOnDisk) {

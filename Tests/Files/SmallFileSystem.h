@@ -11,8 +11,9 @@ namespace files_test {
 
 class SmallFileSystem {
  public:
-  explicit SmallFileSystem(const std::string& path) : path_(path) {
-    mounted_ = ::mount("tmpfs", path.c_str(), "tmpfs", 0, "size=256k") == 0;
+  explicit SmallFileSystem(const std::string& path, const char* options = "size=256k")
+      : path_(path) {
+    mounted_ = ::mount("tmpfs", path.c_str(), "tmpfs", 0, options) == 0;
   }
   ~SmallFileSystem() {
     if (mounted_) ::umount2(path_.c_str(), MNT_DETACH);

@@ -8,6 +8,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstddef>
+#include <span>
 #include <string_view>
 #include <vector>
 
@@ -73,22 +74,47 @@ bool IsCarried(std::string_view attribute) {
   return !attribute.starts_with("security.") && !attribute.starts_with("trusted.");
 }
 
+/// Sets an attribute, unless it is of a kind that this file system or process may not set.
+int SetAttribute(int to, const char* name, std::span<const char> value) {
+  if (::fsetxattr(to, name, value.data(), value.size(), 0) == 0) return 0;
+  switch (errno) {
+    case EOPNOTSUPP:
+    case EPERM:
+    case EACCES:
+      return 0;
+    case ENOSPC:
+    case EDQUOT:
+      return E2BIG;  // no room where attributes are kept, one block as a rule: the disk is not full
+    default:
+      return errno;
+  }
+}
+
+/// The names of a file's attributes, each with a zero behind it; none on a file system without.
+std::vector<char> AttributeNames(int file) {
+  std::vector<char> names;
+  for (;;) {
+    ssize_t length = ::flistxattr(file, nullptr, 0);
+    if (length <= 0) return {};
+    names.resize(static_cast<std::size_t>(length));
+    length = ::flistxattr(file, names.data(), names.size());
+    if (length < 0 && errno == ERANGE) continue;  // one has been added meanwhile
+    names.resize(static_cast<std::size_t>(std::max<ssize_t>(length, 0)));
+    return names;
+  }
+}
+
 int CopyExtendedAttributes(int from, int to) {
-  const ssize_t length = ::flistxattr(from, nullptr, 0);
-  if (length <= 0) return 0;  // none, or a file system that has none
-  std::vector<char> names(static_cast<std::size_t>(length));
-  const ssize_t got = ::flistxattr(from, names.data(), names.size());
-  if (got < 0) return errno;
-  const char* end = names.data() + got;
-  std::vector<char> value(64 * 1024);  // the kernel's limit
+  const std::vector<char> names = AttributeNames(from);
+  const char* end = names.data() + names.size();
+  std::vector<char> value;
   for (const char* name = names.data(); name < end; name += std::string_view(name).size() + 1) {
     if (!IsCarried(name)) continue;
+    value.resize(std::size_t{64} * 1024);  // the kernel's limit
     const ssize_t size = ::fgetxattr(from, name, value.data(), value.size());
     if (size < 0) continue;  // taken away meanwhile
-    if (::fsetxattr(to, name, value.data(), static_cast<std::size_t>(size), 0) != 0 &&
-        errno != EOPNOTSUPP && errno != EPERM && errno != EACCES) {
-      return errno;
-    }
+    const std::span<const char> content(value.data(), static_cast<std::size_t>(size));
+    if (const int error = SetAttribute(to, name, content)) return error;
   }
   return 0;
 }

@@ -121,7 +121,10 @@ class FileManagerPosix final : public FileManager {
   FileKind kind(const FilePlace& place) override {
     struct stat status {};
     if (place.subpath.empty()) {
-      if (::stat(place.path.c_str(), &status) != 0) return FileKind::kAbsent;
+      // As every operation takes it: a slash at the end does not demand a directory.
+      const std::string path = place.path.substr(0, place.path.find_last_not_of('/') + 1);
+      const bool isRoot = path.empty() && !place.path.empty();
+      if (::stat(isRoot ? "/" : path.c_str(), &status) != 0) return FileKind::kAbsent;
     } else {
       FileLocation at;
       if (Locate(place, at) != 0) return FileKind::kAbsent;
