@@ -5,6 +5,8 @@
 // The entitlement checked at connect is the only guard.
 #include "Helper/Proxies/OneCallServices.h"
 
+#include <bit>
+#include <cstring>
 #include <memory>
 #include <span>
 
@@ -46,8 +48,10 @@ void SetRadioManagerLogToFile(bool enabled) {
 }
 
 KernReturn server_HvMobileHelperIsVoicemailSubscribed(PortName /*port*/, wire::Flag& subscribed) {
-  // The lowest byte of the field; the prepared reply holds zeros in the other three.
-  subscribed.value = IsVoicemailServiceSubscribed();
+  // Kept: only the field's lowest byte is written; the prepared reply holds zeros in the others.
+  static_assert(std::endian::native == std::endian::little);
+  const std::uint8_t answer = IsVoicemailServiceSubscribed();
+  std::memcpy(&subscribed.value, &answer, sizeof answer);
   return KERN_SUCCESS;
 }
 

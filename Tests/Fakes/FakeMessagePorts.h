@@ -8,6 +8,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <deque>
+#include <functional>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -32,6 +33,8 @@ class FakeMessagePorts final : public platform::MessagePorts {
 
   void publish(const std::string& name) { state_->publish(name); }
   void retract(const std::string& name) { state_->retract(name); }
+  /// Has every attempt to send call `observer`, on the sender's thread, before anything else.
+  void observeSends(std::function<void()> observer) { state_->observe(std::move(observer)); }
 
   /// The oldest message at `name` that was not taken yet; blocks until there is one.
   [[nodiscard]] Message take(const std::string& name) { return state_->take(name); }
@@ -47,7 +50,12 @@ class FakeMessagePorts final : public platform::MessagePorts {
     std::mutex mutex;
     std::condition_variable arrived;
     std::map<std::string, std::deque<Message>> queues;
+    std::function<void()> observer;
 
+    void observe(std::function<void()> newObserver) {
+      const std::lock_guard guard(mutex);
+      observer = std::move(newObserver);
+    }
     void publish(const std::string& name) {
       const std::lock_guard guard(mutex);
       queues[name];
@@ -74,6 +82,7 @@ class FakeMessagePorts final : public platform::MessagePorts {
     }
     bool send(const std::string& name, Message message) {
       const std::lock_guard guard(mutex);
+      if (observer) observer();
       const auto queue = queues.find(name);
       if (queue == queues.end() || queue->second.size() >= kQueueLimit) return false;
       queue->second.push_back(std::move(message));

@@ -6,6 +6,7 @@
 
 #include <thread>
 
+#include "Helper/Shared/Server/RequestRoutines.h"
 #include "Tests/Fakes/FakeEchoService.h"
 #include "Tests/Fakes/FakeMessagePorts.h"
 #include "Tests/Support/ServerFixture.h"
@@ -74,11 +75,20 @@ TEST_F(OneCallServices, FindNoSubscriptionFunctionWithoutTheLibraryAndSayNothing
   EXPECT_TRUE(log.takeLines().empty());
 }
 
+TEST_F(OneCallServices, AnswerTheSubscriptionInTheLowestByteAndWriteNoOther) {
+  wire::Flag subscribed{0xffff'ffff};
+  EXPECT_EQ(server_HvMobileHelperIsVoicemailSubscribed(kPortNull, subscribed), 0);
+  EXPECT_EQ(subscribed.value, 0xffff'ff00);
+}
+
 TEST_F(OneCallServices, TellTheRadioManagerBeforeTheyLogTheIntegerAsItCame) {
   ports.publish(kRadioManager);
   for (const auto& [value, enabled] :
        {std::pair{2, 1}, std::pair{1, 1}, std::pair{-1, 1}, std::pair{0, 0}}) {
+    Lines before{{LogPriority::kError, "nothing was sent"}};
+    ports.observeSends([&] { before = log.takeLines(); });
     EXPECT_EQ(sendInteger(kSetLogging, value), successReply(kSetLogging));
+    EXPECT_EQ(before, Lines{});
     EXPECT_EQ(ports.take(kRadioManager), logToFile(static_cast<std::uint8_t>(enabled)));
     EXPECT_EQ(log.takeLines(),
               (Lines{{LogPriority::kError,
