@@ -49,8 +49,7 @@ void HeartbeatSetEnabled(HelperServer* server, std::int32_t enabled) {
 }
 
 void HeartbeatStart(Heartbeat& heartbeat, HelperServer* server) {
-  // A null server is not expected here: a request always finds that of its own port.
-  if (!server) return;
+  // Kept: a start does not ask whether there is a server; without one it runs and holds no token.
   heartbeat.server = server;
   heartbeat.timer.reset();
   heartbeat.timer = std::make_unique<platform::TimerSource>(

@@ -24,11 +24,13 @@ inline constexpr const char* kHeartbeatQueueLabel = "com.zarvo.otaheartbeat";
 
 /// Switches the process's heartbeat on (`enabled` not 0) or off, on its queue and not before this
 /// call returns. Any thread. `server` may be null.
+///
+/// Kept: every switch is carried out, in turn, however many wait. Each start has an exchange and a
+/// work token of its own, so none can be left out or merged with the next unseen.
 void HeartbeatSetEnabled(HelperServer* server, std::int32_t enabled);
 
 /// Sends one echo request at once, then one right away and every two seconds by a timer, and takes
-/// a work token of `server`. Without a server, or once it is gone, there is nothing to keep the
-/// process for: no token is held, and without a server nothing is started.
+/// a work token of `server`. Without a server, or once it is gone, no token is held.
 void HeartbeatStart(Heartbeat& heartbeat, HelperServer* server);
 
 /// Ends the timer and gives the work token to `server`; without one the token is forgotten.
