@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // A preferences store in memory. Several stores may share one storage, as processes share the files
-// of a system. Any thread; one lock per store, and the storage belongs to one thread at a time.
+// of a system; what others stored is seen as late as a store may show it, at the next synchronize.
+// Any thread; one lock per store, and the storage belongs to one thread at a time.
 #pragma once
 
 #include <array>
@@ -78,11 +79,13 @@ class FakePreferencesStore final : public platform::PreferencesStore {
     for (const auto& [scope, host] : kSearched) {
       if (user == platform::UserScope::kAnyUser || scope == user) {
         pending_.erase({domain, scope, host});
+        seen_.erase({domain, scope, host});
       }
     }
   }
 
  private:
+  using Values = Storage::mapped_type;
   using Changes = std::map<std::string, std::optional<platform::PropertyList>>;
 
   static constexpr std::array<std::pair<platform::UserScope, platform::HostScope>, 4> kSearched{
@@ -96,14 +99,25 @@ class FakePreferencesStore final : public platform::PreferencesStore {
       const auto change = changes->second.find(key);
       if (change != changes->second.end()) return change->second;
     }
+    if (!seen_.contains(domain)) look(domain);
+    const Values& values = seen_[domain];
+    const auto value = values.find(key);
+    return value == values.end() ? std::nullopt : std::optional(value->second);
+  }
+
+  void look(const Domain& domain) {
     const auto values = storage_->find(domain);
-    if (values == storage_->end()) return std::nullopt;
-    const auto value = values->second.find(key);
-    return value == values->second.end() ? std::nullopt : std::optional(value->second);
+    seen_[domain] = values == storage_->end() ? Values{} : values->second;
   }
 
   bool store(const Domain& domain) {
     synchronized_.push_back(domain);
+    const bool stored = write(domain);
+    look(domain);
+    return stored;
+  }
+
+  bool write(const Domain& domain) {
     const auto changes = pending_.find(domain);
     if (changes == pending_.end()) return true;
     if (!writable_) return false;
@@ -121,6 +135,7 @@ class FakePreferencesStore final : public platform::PreferencesStore {
   std::mutex mutex_;
   std::shared_ptr<Storage> storage_;
   std::map<Domain, Changes> pending_;
+  std::map<Domain, Values> seen_;  // as of the last synchronize, or else of the first look
   std::vector<Domain> synchronized_;
   bool writable_ = true;
 };

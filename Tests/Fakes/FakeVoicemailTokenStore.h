@@ -9,6 +9,8 @@
 #include <mutex>
 #include <optional>
 #include <string>
+#include <utility>
+#include <vector>
 
 #include "Helper/Platform/VoicemailTokenStore.h"
 
@@ -16,11 +18,14 @@ namespace fakes {
 
 class FakeVoicemailTokenStore final : public platform::VoicemailTokenStore {
  public:
+  /// What changes the storage.
+  enum class Change { kSetCurrentToken, kClearCurrentToken, kSetToken, kRemoveAllRecords };
   struct Storage {
     std::mutex mutex;
     std::optional<std::string> current;
     std::map<std::string, std::string> tokens;
     int records = 0;
+    std::vector<Change> changes;
   };
 
   FakeVoicemailTokenStore() : FakeVoicemailTokenStore(std::make_shared<Storage>()) {}
@@ -30,10 +35,12 @@ class FakeVoicemailTokenStore final : public platform::VoicemailTokenStore {
   void setCurrentToken(const std::optional<std::string>& token) override {
     const std::lock_guard guard(storage_->mutex);
     storage_->current = token;
+    storage_->changes.push_back(token ? Change::kSetCurrentToken : Change::kClearCurrentToken);
   }
   void setToken(const std::string& key, const std::string& token) override {
     const std::lock_guard guard(storage_->mutex);
     storage_->tokens.insert_or_assign(key, token);
+    storage_->changes.push_back(Change::kSetToken);
   }
   std::optional<std::string> copyCurrentToken() override {
     const std::lock_guard guard(storage_->mutex);
@@ -47,6 +54,7 @@ class FakeVoicemailTokenStore final : public platform::VoicemailTokenStore {
   void removeAllRecords() override {
     const std::lock_guard guard(storage_->mutex);
     storage_->records = 0;
+    storage_->changes.push_back(Change::kRemoveAllRecords);
   }
 
   /// What the voicemail service itself does.
@@ -57,6 +65,11 @@ class FakeVoicemailTokenStore final : public platform::VoicemailTokenStore {
   [[nodiscard]] int records() {
     const std::lock_guard guard(storage_->mutex);
     return storage_->records;
+  }
+  /// What was changed since the last call, in that order.
+  [[nodiscard]] std::vector<Change> takeChanges() {
+    const std::lock_guard guard(storage_->mutex);
+    return std::exchange(storage_->changes, {});
   }
 
  private:

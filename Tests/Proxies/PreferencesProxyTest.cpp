@@ -39,7 +39,9 @@ class PreferencesProxy : public support::ServerFixture {
   }
   std::optional<PropertyList> stored() { return store.copyValue("key", {.identifier = "domain"}); }
 
-  fakes::FakePreferencesStore store;
+  std::shared_ptr<fakes::FakePreferencesStore::Storage> storage =
+      std::make_shared<fakes::FakePreferencesStore::Storage>();
+  fakes::FakePreferencesStore store{storage};
   platform::ScopedReplacement<platform::PreferencesStore> storeReplacement{store};
   fakes::FakeTaskMemory memory;
   platform::ScopedReplacement<platform::TaskMemory> memoryReplacement{memory};
@@ -103,6 +105,21 @@ TEST_F(PreferencesProxy, AppCopySearchesTheUsualScopesAndLogsItsOwnLine) {
   EXPECT_EQ(copy(kCopyApp), support::OutOfLineReply(kCopyApp, kXml));
   EXPECT_EQ(log.takeLines(), (Lines{{LogPriority::kError, "VM_ALLOCATE 93l (mhs2)\n"}}));
   EXPECT_EQ(memory.regions(), 0);
+}
+
+TEST_F(PreferencesProxy, CopySynchronizesFirstAndSoShowsWhatAnotherProcessStored) {
+  fakes::FakePreferencesStore other(storage);
+  const auto storeElsewhere = [&](std::optional<PropertyList> value) {
+    other.setValue("key", std::move(value), {.identifier = "domain"});
+    ASSERT_TRUE(other.synchronize({.identifier = "domain"}));
+  };
+  for (const std::int32_t id : {kCopy, kCopyApp}) {
+    ASSERT_EQ(copy(id), support::OutOfLineReply(id, ""));
+    storeElsewhere("value");
+    EXPECT_EQ(copy(id), support::OutOfLineReply(id, kXml));
+    storeElsewhere(std::nullopt);
+    EXPECT_EQ(copy(id), support::OutOfLineReply(id, ""));
+  }
 }
 
 TEST_F(PreferencesProxy, SynchronizesTheDomainOnceInEachOfItsRequests) {

@@ -125,7 +125,11 @@ TEST_F(VoicemailTokens, AreClearedWithTheRecordsByAResetButNotThoseByKey) {
   ASSERT_EQ(send(kSet, {"token"}), reply(kSet, 0));
   ASSERT_EQ(send(kSetForKey, {"key", "token"}), reply(kSetForKey, 0));
   tokens.addRecord();
+  (void)tokens.takeChanges();
   EXPECT_EQ(send(kReset, {}), reply(kReset, 0));
+  using enum fakes::FakeVoicemailTokenStore::Change;
+  EXPECT_EQ(tokens.takeChanges(), (std::vector{kClearCurrentToken, kRemoveAllRecords}))
+      << "the current token first";
   EXPECT_FALSE(tokens.copyCurrentToken());
   EXPECT_EQ(tokens.records(), 0);
   EXPECT_EQ(tokens.copyToken("key"), "token");
