@@ -28,7 +28,7 @@ class PosixDirectoryEntries final : public DirectoryEntries {
 
 template <>
 DirectoryEntries& DefaultProvider<DirectoryEntries>() {
-  static PosixDirectoryEntries entries;
+  static auto& entries = *new PosixDirectoryEntries;
   return entries;
 }
 

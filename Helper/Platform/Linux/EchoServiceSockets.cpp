@@ -128,7 +128,7 @@ class RawEchoService final : public EchoService {
 
 template <>
 EchoService& DefaultProvider<EchoService>() {
-  static RawEchoService service;
+  static auto& service = *new RawEchoService;
   return service;
 }
 

@@ -227,7 +227,7 @@ class FileManagerPosix final : public FileManager {
 
 template <>
 FileManager& DefaultProvider<FileManager>() {
-  static FileManagerPosix manager;
+  static auto& manager = *new FileManagerPosix;
   return manager;
 }
 

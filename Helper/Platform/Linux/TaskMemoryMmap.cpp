@@ -51,7 +51,7 @@ class MappedTaskMemory final : public TaskMemory {
 
 template <>
 TaskMemory& DefaultProvider<TaskMemory>() {
-  static MappedTaskMemory memory;
+  static auto& memory = *new MappedTaskMemory;
   return memory;
 }
 

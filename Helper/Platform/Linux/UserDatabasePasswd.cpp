@@ -95,7 +95,7 @@ class PasswdDatabase final : public UserDatabase {
 
 template <>
 UserDatabase& DefaultProvider<UserDatabase>() {
-  static PasswdDatabase database;
+  static auto& database = *new PasswdDatabase;
   return database;
 }
 

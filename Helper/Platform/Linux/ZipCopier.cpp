@@ -194,7 +194,7 @@ std::unique_ptr<ArchiveCopier> MakeZipCopier(const ArchiveLimits& limits) {
 
 template <>
 ArchiveCopierFactory& DefaultProvider<ArchiveCopierFactory>() {
-  static ZipCopierFactory factory;
+  static auto& factory = *new ZipCopierFactory;
   return factory;
 }
 
