@@ -36,13 +36,13 @@ struct Capabilities {
 };
 
 /// Each with the request that needs it.
-constexpr std::array kNeeded{
+constexpr auto kNeeded = std::to_array<unsigned>({
     CAP_SYS_PTRACE,    // every connect: which executable the caller runs
     CAP_DAC_OVERRIDE,  // files: the mobile user's home; messages to the telephony daemon's ports
     CAP_CHOWN,         // CopyFile, CopyCrashLogs, MoveCarrierBundles: whose a placed item is
     CAP_FOWNER,        // the same and ExtractArchive: permissions and times of what others own
     CAP_NET_RAW,       // TriggerHeartbeat: echo requests
-};
+});
 
 Capabilities CurrentCapabilities() {
   Capabilities current;
