@@ -165,6 +165,14 @@ const std::string& WorkQueue::label() const { return state_->label; }
 
 void WorkQueue::async(Work work) { state_->submit(std::move(work)); }
 
+bool WorkQueue::tryAsync(Work work) {
+  const std::lock_guard guard(state_->mutex);
+  state_->startThread();
+  if (!state_->threadRuns) return false;
+  state_->work.push_back(std::move(work));
+  return true;
+}
+
 void WorkQueue::sync(const Work& work) {
   std::binary_semaphore done(0);
   async([&] {

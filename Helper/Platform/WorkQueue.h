@@ -32,6 +32,10 @@ class WorkQueue {
   /// the system refuses a thread the work waits for the next submission.
   void async(Work work);
 
+  /// As async(), for work that somebody waits for: false, and `work` is not kept, where the system
+  /// refuses the thread that would run it.
+  [[nodiscard]] bool tryAsync(Work work);
+
   /// Runs `work` on the queue and returns when it has run. Not from the queue itself.
   void sync(const Work& work);
 

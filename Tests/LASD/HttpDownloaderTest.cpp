@@ -11,6 +11,7 @@
 #include <filesystem>
 #include <fstream>
 #include <iterator>
+#include <optional>
 #include <semaphore>
 #include <thread>
 
@@ -18,6 +19,7 @@
 #include "Tests/Fakes/FakeHttpTransport.h"
 #include "Tests/Fakes/FakeSystemLog.h"
 #include "Tests/Http/GzipForTest.h"
+#include "Tests/Support/ThreadsRefused.h"
 
 namespace {
 
@@ -120,6 +122,30 @@ TEST_F(HttpDownloads, SayWhenNoResponseCame) {
   web.answer(kUrl, [](const auto&) { return nullptr; });
   EXPECT_FALSE(downloader.fetch(kUrl, true));
   EXPECT_EQ(log.takeLines(), (Lines{Fetching(kUrl), Notice("Did not receive HTTP response!\n")}));
+}
+
+TEST_F(HttpDownloads, FailWhereTheSystemHasNoThreadForTheTransfer) {
+  web.put(kUrl, 200, BytesOf("x"), {});
+  {
+    const support::ThreadsRefused refused;
+    EXPECT_FALSE(downloader.fetch(kUrl, true));
+  }
+  EXPECT_EQ(log.takeLines(), (Lines{Fetching(kUrl), Notice("Did not receive HTTP response!\n")}));
+  EXPECT_TRUE(web.transfers().empty());
+  EXPECT_TRUE(downloader.fetch(kUrl, true)) << "nothing is left of the attempt";
+}
+
+TEST_F(HttpDownloads, ReceiveTheResponseWhereTheirQueueGetsNoThread) {
+  std::optional<support::ThreadsRefused> refused;
+  web.answer(kUrl, [&](const vlu::Http::Transfer&) {
+    refused.emplace();
+    return std::make_shared<HttpResponse>(ErrorType::kSuccess, 200, BytesOf("x"),
+                                          vlu::Http::HeaderMap());
+  });
+  EXPECT_TRUE(downloader.fetch(kUrl, true));
+  refused.reset();
+  EXPECT_EQ(log.takeLines(),
+            (Lines{Fetching(kUrl), Notice("URL retrieved " + kUrl + ", size: 1 \n")}));
 }
 
 TEST_F(HttpDownloads, AnEmptyBodyIsRetrievedAndYetAFailure) {

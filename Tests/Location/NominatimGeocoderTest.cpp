@@ -151,7 +151,7 @@ TEST_F(NominatimGeocoder, SaysWhyItCouldNotAsk) {
   EXPECT_EQ(lookUp({1, 2}), std::string("the geocoder cannot be asked: ") +
                                 vlu::Http::asString(ErrorType::kHostNotFound));
   web.answer(UrlFor("1.0000", "2.0000"), [](const vlu::Http::Transfer&) { return nullptr; });
-  EXPECT_EQ(lookUp({1, 2}), "the geocoder's answer found no memory");
+  EXPECT_EQ(lookUp({1, 2}), "the system has no means left to ask the geocoder");
 }
 
 TEST_F(NominatimGeocoder, GivesALateAnswerUp) {

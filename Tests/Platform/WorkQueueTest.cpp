@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "Tests/Fakes/ManualClock.h"
+#include "Tests/Support/ThreadsRefused.h"
 
 namespace {
 
@@ -81,6 +82,46 @@ TEST(WorkQueue, ReleasesWhatWorkHoldsOnceItHasRun) {
   queue.async([held = std::move(held)] {});
   queue.sync([] {});
   EXPECT_TRUE(watch.expired());
+}
+
+TEST(WorkQueue, KeepsWorkThatGetsNoThreadForTheNextSubmission) {
+  WorkQueue queue("test.refused");
+  std::vector<int> order;
+  {
+    const support::ThreadsRefused refused;
+    queue.async([&] { order.push_back(1); });
+  }
+  queue.async([&] { order.push_back(2); });
+  queue.sync([] {});
+  EXPECT_EQ(order, (std::vector<int>{1, 2}));
+}
+
+TEST(WorkQueue, SaysOnRequestThatItGetsNoThreadAndForgetsTheWork) {
+  WorkQueue queue("test.refused");
+  auto held = std::make_shared<int>(1);
+  const std::weak_ptr<int> watch = held;
+  bool ran = false;
+  {
+    const support::ThreadsRefused refused;
+    EXPECT_FALSE(queue.tryAsync([&ran, held = std::move(held)] { ran = true; }));
+  }
+  EXPECT_TRUE(watch.expired());
+  queue.sync([] {});
+  EXPECT_FALSE(ran);
+  EXPECT_TRUE(queue.tryAsync([&] { ran = true; }));
+  queue.sync([] {});
+  EXPECT_TRUE(ran);
+}
+
+TEST(WorkQueue, NeedsNoOtherThreadWhileItsOwnRuns) {
+  WorkQueue queue("test.running");
+  bool ran = false;
+  queue.sync([&] {
+    const support::ThreadsRefused refused;
+    EXPECT_TRUE(queue.tryAsync([&] { ran = true; }));
+  });
+  queue.sync([] {});
+  EXPECT_TRUE(ran);
 }
 
 class TimedQueue : public testing::Test {

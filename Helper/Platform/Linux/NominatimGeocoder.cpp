@@ -131,7 +131,7 @@ GeocodeAnswer NominatimGeocoder::lookUp(const Coordinate& place) {
     return GeocodeError{"the geocoder did not answer in time"};
   }
   const Response answer = response.get();
-  if (!answer) return GeocodeError{"the geocoder's answer found no memory"};
+  if (!answer) return GeocodeError{"the system has no means left to ask the geocoder"};
   return Read(*answer);
 }
 

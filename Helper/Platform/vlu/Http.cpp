@@ -68,6 +68,12 @@ constexpr std::array kStatusPhrases{
     StatusPhrase{505, "http version not supported"},
 };
 
+/// Hands `response` over on `queue`, and here where that gets no thread: somebody may wait for it.
+void DeliverResponse(platform::WorkQueue& queue, const HttpRequest::CompletionCallback& callback,
+                     const std::shared_ptr<HttpResponse>& response) {
+  if (!queue.tryAsync([callback, response] { callback(response); })) callback(response);
+}
+
 bool IsTokenCharacter(char c) {
   constexpr std::string_view kMarks = "!#$%&'*+-.^_`|~";
   return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') ||
@@ -152,12 +158,13 @@ std::shared_ptr<HttpRequest> HttpRequest::create(RequestType type, const std::st
 
 void HttpRequest::start(const std::string& /*body*/) {
   // A queue of the transfer's own, given up at once: it lives until its work is done.
-  platform::WorkQueue("vlu.http")
-      .async([transfer = Transfer{url_, headers_, session_->allowsCellular()}, queue = queue_,
-              callback = callback_] {
-        auto response = platform::Shared<HttpTransport>().retrieve(transfer);
-        queue->async([callback, response] { callback(response); });
+  platform::WorkQueue transfers("vlu.http");
+  const bool started =
+      transfers.tryAsync([transfer = Transfer{url_, headers_, session_->allowsCellular()},
+                          queue = queue_, callback = callback_] {
+        DeliverResponse(*queue, callback, platform::Shared<HttpTransport>().retrieve(transfer));
       });
+  if (!started) DeliverResponse(*queue_, callback_, nullptr);
 }
 
 }  // namespace vlu::Http

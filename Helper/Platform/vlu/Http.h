@@ -98,13 +98,15 @@ class HttpRequest {
                                                            const HeaderMap& headers,
                                                            std::shared_ptr<HttpSession> session);
 
-  /// The queue on which the completion callback runs. Must live until the callback has begun.
+  /// The queue on which the completion callback runs. Must live until the callback has begun. Where
+  /// the system refuses it a thread, the callback runs on the transfer's.
   void setCallbackQueue(platform::WorkQueue& queue) { queue_ = &queue; }
   void setCompletionCallback(CompletionCallback callback) { callback_ = std::move(callback); }
 
   /// Starts the transfer and returns. The callback runs exactly once per start, in bounded time
-  /// whatever the server does. A retrieval has no body: `body` is not sent. Needs queue and
-  /// callback. The request may be released while the transfer is under way.
+  /// whatever the server does; with an empty pointer, and perhaps inside this call, where the
+  /// system refuses the transfer a thread. A retrieval has no body: `body` is not sent. Needs queue
+  /// and callback. The request may be released while the transfer is under way.
   void start(const std::string& body);
 
  private:
