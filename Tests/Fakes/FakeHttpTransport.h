@@ -74,10 +74,24 @@ class FakeHttpTransport final : public vlu::Http::HttpTransport {
       const auto found = answers_.find(transfer.url);
       if (found != answers_.end()) answer = found->second;
     }
-    return answer(transfer);
+    return Limited(answer(transfer), transfer.longestBody);
   }
 
  private:
+  /// What a transport makes of a response whose body is longer than the transfer wants it.
+  static std::shared_ptr<vlu::Http::HttpResponse> Limited(
+      std::shared_ptr<vlu::Http::HttpResponse> response, std::size_t longestBody) {
+    if (!response) return nullptr;
+    auto body = response->takeBody();
+    if (body.size() > longestBody) {
+      return std::make_shared<vlu::Http::HttpResponse>(
+          vlu::Http::ErrorType::kTooLarge, response->statusCode(), std::vector<std::uint8_t>(),
+          vlu::Http::HeaderMap());
+    }
+    return std::make_shared<vlu::Http::HttpResponse>(response->errorType(), response->statusCode(),
+                                                     std::move(body), response->takeHeaders());
+  }
+
   static std::shared_ptr<vlu::Http::HttpResponse> NotFound(
       const vlu::Http::Transfer& /*transfer*/) {
     return std::make_shared<vlu::Http::HttpResponse>(

@@ -87,6 +87,19 @@ TYPED_TEST(HttpTransportContract, AFailureHasNeitherBodyNorHeaders) {
   EXPECT_TRUE(response->takeHeaders().empty());
 }
 
+TYPED_TEST(HttpTransportContract, TakesNoLongerBodyThanTheRequestSays) {
+  const auto request = HttpRequest::create(RequestType::kRetrieval, this->place.url("hello"), {},
+                                           HttpSession::create());
+  ASSERT_TRUE(request);
+  request->setLimits(platform::Duration::max(), 5);
+  EXPECT_EQ(support::ResponseTo(*request)->takeBody(), BytesOf("hello"));
+  request->setLimits(platform::Duration::max(), 4);
+  const auto response = support::ResponseTo(*request);
+  EXPECT_EQ(response->errorType(), ErrorType::kTooLarge);
+  EXPECT_EQ(response->statusCode(), 200);
+  EXPECT_TRUE(response->takeBody().empty());
+}
+
 TYPED_TEST(HttpTransportContract, TakesHttpAndHttpsUrlsWithAHostAndNothingElse) {
   for (const char* url : {"http://host", "https://host.example/", "HTTP://host.example:8080/a?b#c",
                           "https://192.0.2.1/", "http://[2001:db8::1]:80/"}) {

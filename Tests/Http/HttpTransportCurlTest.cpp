@@ -156,6 +156,29 @@ TEST_F(HttpTransfers, EndAtTheOverallLimitWhateverArrives) {
   EXPECT_EQ(errorOf("http", "drip-body"), ErrorType::kTimedOut);
 }
 
+TEST_F(HttpTransfers, EndAtTheRequestsOwnLimits) {
+  auto profile = ShortProfile();
+  profile.overallLimit = std::chrono::hours(1);
+  profile.quietLimit = std::chrono::hours(1);
+  platform::HttpTransportCurl patient(profile);
+  const platform::ScopedReplacement<vlu::Http::HttpTransport> other{patient};
+  const auto outcome = [&](const std::string& path, platform::Duration limit, std::size_t longest) {
+    const auto request =
+        vlu::Http::HttpRequest::create(vlu::Http::RequestType::kRetrieval, web.url("http", path),
+                                       {}, vlu::Http::HttpSession::create());
+    request->setLimits(limit, longest);
+    return support::ResponseTo(*request)->errorType();
+  };
+  constexpr std::size_t kAny = std::size_t{1} << 40;
+  EXPECT_EQ(outcome("drip-body", std::chrono::milliseconds(300), kAny), ErrorType::kTimedOut);
+  for (const std::string form : {"length", "chunked", "until-close"}) {
+    EXPECT_EQ(outcome(form + "/1000", std::chrono::hours(2), 1000), ErrorType::kSuccess) << form;
+    EXPECT_EQ(outcome(form + "/1001", std::chrono::hours(2), 1000), ErrorType::kTooLarge) << form;
+    EXPECT_EQ(outcome(form + "/1000001", std::chrono::hours(2), kAny), ErrorType::kTooLarge)
+        << form << ": the profile's limit stays";
+  }
+}
+
 TEST_F(HttpTransfers, TellABrokenConnectionFromAWholeBody) {
   for (const char* path : {"announced/100", "close", "reset", "cut-chunk", "half-line"}) {
     EXPECT_EQ(errorOf("http", path), ErrorType::kConnectionLost) << path;

@@ -22,6 +22,22 @@ inline std::string TextOf(const std::vector<std::uint8_t>& bytes) {
   return {bytes.begin(), bytes.end()};
 }
 
+/// Starts the request and waits for what comes of it.
+inline std::shared_ptr<vlu::Http::HttpResponse> ResponseTo(vlu::Http::HttpRequest& request) {
+  platform::WorkQueue queue("test");
+  std::binary_semaphore done(0);
+  std::shared_ptr<vlu::Http::HttpResponse> response;
+  request.setCallbackQueue(queue);
+  request.setCompletionCallback([&](std::shared_ptr<vlu::Http::HttpResponse> received) {
+    response = std::move(received);
+    done.release();
+  });
+  request.start("");
+  done.acquire();
+  queue.sync([] {});  // the callback has left the semaphore
+  return response;
+}
+
 /// What came of a request for `url`; empty, and a failed test, when none could be made.
 inline std::shared_ptr<vlu::Http::HttpResponse> Retrieve(const std::string& url,
                                                          const vlu::Http::HeaderMap& headers = {},
@@ -31,19 +47,7 @@ inline std::shared_ptr<vlu::Http::HttpResponse> Retrieve(const std::string& url,
   const auto request =
       vlu::Http::HttpRequest::create(vlu::Http::RequestType::kRetrieval, url, headers, session);
   EXPECT_TRUE(request) << url;
-  if (!request) return nullptr;
-  platform::WorkQueue queue("test");
-  std::binary_semaphore done(0);
-  std::shared_ptr<vlu::Http::HttpResponse> response;
-  request->setCallbackQueue(queue);
-  request->setCompletionCallback([&](std::shared_ptr<vlu::Http::HttpResponse> received) {
-    response = std::move(received);
-    done.release();
-  });
-  request->start("");
-  done.acquire();
-  queue.sync([] {});  // the callback has left the semaphore
-  return response;
+  return request ? ResponseTo(*request) : nullptr;
 }
 
 }  // namespace support

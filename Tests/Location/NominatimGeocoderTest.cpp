@@ -58,6 +58,8 @@ TEST_F(NominatimGeocoder, AsksForThePlaceToFourDecimalsUnderItsOwnName) {
   EXPECT_EQ(web.transfers()[0].headers,
             (vlu::Http::HeaderMap{{"User-Agent", "HalvecMobileHelper/" HALVEC_VERSION}}));
   EXPECT_TRUE(web.transfers()[0].allowsCellular);
+  EXPECT_EQ(web.transfers()[0].limit, std::chrono::seconds(20))
+      << "no longer than it is waited for";
 }
 
 TEST_F(NominatimGeocoder, AsksAtTheEdgesOfTheWorld) {
@@ -152,6 +154,11 @@ TEST_F(NominatimGeocoder, SaysWhyItCouldNotAsk) {
                                 vlu::Http::asString(ErrorType::kHostNotFound));
   web.answer(UrlFor("1.0000", "2.0000"), [](const vlu::Http::Transfer&) { return nullptr; });
   EXPECT_EQ(lookUp({1, 2}), "the system has no means left to ask the geocoder");
+}
+
+TEST_F(NominatimGeocoder, CallsATransferThatTookTooLongLate) {
+  web.fail(UrlFor("1.0000", "2.0000"), ErrorType::kTimedOut);
+  EXPECT_EQ(lookUp({1, 2}), "the geocoder did not answer in time");
 }
 
 TEST_F(NominatimGeocoder, GivesALateAnswerUp) {

@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include <filesystem>
+#include <semaphore>
 #include <string>
 
 #include "Helper/Platform/Linux/HttpTransportCurl.h"
@@ -12,36 +13,47 @@
 #include "Tests/Http/Script.h"
 #include "Tests/Http/WebServer.h"
 
-/// A transfer that is given up goes on until the server is silent for too long, and then this
-/// program has ended: what the TLS library holds for it is no leak.
-extern "C" const char* __lsan_default_suppressions();   // NOLINT(bugprone-reserved-identifier)
-extern "C" const char* __lsan_default_suppressions() {  // NOLINT(bugprone-reserved-identifier)
-  return "leak:libcrypto.so\nleak:libssl.so\nleak:libcurl.so\n";
-}
-
 namespace {
 
 using platform::CivicAddress;
 using platform::GeocodeError;
 using platform::OpenSea;
 
-/// Never destroyed: a look-up that was given up goes on in its own thread.
-platform::HttpTransportCurl& Transport() {
-  static auto& transport = *new platform::HttpTransportCurl([] {
-    platform::HttpProfile profile;
-    profile.certificates = support::WebServer::authority();
-    return profile;
-  }());
-  return transport;
+platform::HttpProfile ProfileForTest() {
+  platform::HttpProfile profile;
+  profile.certificates = support::WebServer::authority();
+  return profile;
 }
+
+/// The real transport, which tells when a transfer has ended.
+class WatchedTransport final : public vlu::Http::HttpTransport {
+ public:
+  explicit WatchedTransport(const platform::HttpProfile& profile) : transport_(profile) {}
+  bool accepts(const std::string& url) override { return transport_.accepts(url); }
+  std::shared_ptr<vlu::Http::HttpResponse> retrieve(const vlu::Http::Transfer& transfer) override {
+    auto response = transport_.retrieve(transfer);
+    ended_.release();
+    return response;
+  }
+  void waitForTheEnd() { ended_.acquire(); }
+
+ private:
+  platform::HttpTransportCurl transport_;
+  std::counting_semaphore<> ended_{0};
+};
 
 class OnlineGeocoder : public ::testing::Test {
  protected:
+  explicit OnlineGeocoder(const platform::HttpProfile& profile = ProfileForTest())
+      : transport(profile) {}
+
+  /// Waits for the end of the transfer, too.
   std::string lookUp(double latitude, double longitude,
                      platform::Duration limit = std::chrono::seconds(20)) {
     platform::NominatimGeocoder geocoder("https://127.0.0.1:" + server.lines().at(0) + "/base",
                                          limit);
     const platform::GeocodeAnswer answer = geocoder.lookUp({latitude, longitude});
+    transport.waitForTheEnd();
     if (const auto* error = std::get_if<GeocodeError>(&answer)) return error->description;
     if (std::holds_alternative<OpenSea>(answer)) return "sea";
     const auto& address = std::get<CivicAddress>(answer);
@@ -52,7 +64,8 @@ class OnlineGeocoder : public ::testing::Test {
   support::Script server{
       {LOCATION_TEST_SCRIPTS "/geocoder_server.py",
        std::filesystem::path(support::WebServer::authority()).parent_path() / "good.pem"}};
-  platform::ScopedReplacement<vlu::Http::HttpTransport> replacement{Transport()};
+  WatchedTransport transport;
+  platform::ScopedReplacement<vlu::Http::HttpTransport> replacement{transport};
 };
 
 TEST_F(OnlineGeocoder, IsUnderstoodByAServerOfItsProtocol) {
@@ -75,9 +88,20 @@ TEST_F(OnlineGeocoder, GivesASilentServerUp) {
   EXPECT_EQ(lookUp(4, 1, std::chrono::milliseconds(1)), "the geocoder did not answer in time");
 }
 
-TEST_F(OnlineGeocoder, AsksNobodyWhomTheSystemDoesNotTrust) {
-  platform::HttpTransportCurl strict;
-  const platform::ScopedReplacement<vlu::Http::HttpTransport> strictReplacement(strict);
+TEST_F(OnlineGeocoder, EndsTheTransferOfAServerThatNeverEndsItsAnswer) {
+  EXPECT_EQ(lookUp(6, 1, std::chrono::milliseconds(200)), "the geocoder did not answer in time");
+}
+
+TEST_F(OnlineGeocoder, EndsTheTransferOfAnAnswerThatIsTooLong) {
+  EXPECT_EQ(lookUp(7, 1), "the geocoder's answer is too long");
+}
+
+class DistrustfulGeocoder : public OnlineGeocoder {
+ protected:
+  DistrustfulGeocoder() : OnlineGeocoder(platform::HttpProfile()) {}
+};
+
+TEST_F(DistrustfulGeocoder, AsksNobodyWhomTheSystemDoesNotTrust) {
   EXPECT_EQ(lookUp(47, 8), std::string("the geocoder cannot be asked: ") +
                                vlu::Http::asString(vlu::Http::ErrorType::kNotTrusted));
 }

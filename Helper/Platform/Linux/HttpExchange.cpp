@@ -35,6 +35,7 @@ HttpExchange::HttpExchange(const CurlLibrary& curl, const HttpProfile& profile,
     : curl_(curl),
       profile_(profile),
       transfer_(transfer),
+      longestBody_(std::min(profile.longestBody, transfer.longestBody)),
       fields_(nullptr, curl.slistFreeAll),
       addresses_(nullptr, curl.slistFreeAll),
       easy_(curl.easyInit(), curl.easyCleanup) {}
@@ -107,7 +108,7 @@ void HttpExchange::setLimits(TimePoint connected, TimePoint deadline) {
   set(CURLOPT_TIMEOUT_MS, LimitOf(deadline));
   set(CURLOPT_LOW_SPEED_LIMIT, profile_.slowestRate);
   set(CURLOPT_LOW_SPEED_TIME, static_cast<long>(profile_.quietLimit.count()));
-  set(CURLOPT_MAXFILESIZE_LARGE, static_cast<curl_off_t>(profile_.longestBody));
+  set(CURLOPT_MAXFILESIZE_LARGE, static_cast<curl_off_t>(longestBody_));
 }
 
 void HttpExchange::setHeaders() {
@@ -139,7 +140,7 @@ std::size_t HttpExchange::OnBody(const char* data, std::size_t /*one*/, std::siz
 
 bool HttpExchange::take(const char* data, std::size_t length) {
   const std::size_t needed = body_.size() + length;
-  if (needed > profile_.longestBody) return false;
+  if (needed > longestBody_) return false;
   try {
     if (needed > body_.capacity()) {
       curl_off_t announced = 0;
@@ -147,7 +148,7 @@ bool HttpExchange::take(const char* data, std::size_t length) {
       // In few steps, because each is a copy; pages that are never touched cost nothing.
       const std::size_t wanted = std::max({needed, kFirstCapacity, body_.capacity() * kGrowth});
       const auto exact = static_cast<std::size_t>(std::max<curl_off_t>(announced, 0));
-      body_.reserve(std::min(exact >= needed ? exact : wanted, profile_.longestBody));
+      body_.reserve(std::min(exact >= needed ? exact : wanted, longestBody_));
     }
     body_.insert(body_.end(), data, data + length);
   } catch (const std::bad_alloc&) {

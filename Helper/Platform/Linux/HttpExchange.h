@@ -54,6 +54,7 @@ class HttpExchange {
   const CurlLibrary& curl_;
   const HttpProfile& profile_;
   const vlu::Http::Transfer& transfer_;
+  const std::size_t longestBody_;
   Strings fields_;
   Strings addresses_;
   std::unique_ptr<CURL, decltype(&::curl_easy_cleanup)> easy_;

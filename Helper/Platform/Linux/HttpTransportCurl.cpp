@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Helper/Platform/Linux/HttpTransportCurl.h"
 
+#include <algorithm>
 #include <utility>
 
 #include "Helper/Platform/Linux/CurlLibrary.h"
@@ -39,7 +40,8 @@ std::shared_ptr<HttpResponse> HttpTransportCurl::retrieve(const vlu::Http::Trans
   HttpTarget target;
   std::string url = transfer.url;
   if (!curl || !ParseHttpUrl(*curl, url, target)) return Failure(ErrorType::kUnknown, 0);
-  const TimePoint deadline = std::chrono::steady_clock::now() + Duration(profile_.overallLimit);
+  const TimePoint deadline =
+      std::chrono::steady_clock::now() + std::min(Duration(profile_.overallLimit), transfer.limit);
   // Hop by hop, because each name must be resolved and each address bound anew.
   int status = 0;
   for (int hop = 0; hop <= profile_.mostRedirects; ++hop) {

@@ -12,7 +12,7 @@
 
 namespace platform {
 
-/// The limits of every transfer; tests choose shorter ones.
+/// The limits of every transfer, which may have lower ones of its own; tests choose shorter ones.
 struct HttpProfile {
   /// The authorities that a server's certificate may come from (PEM).
   std::string certificates = "/etc/ssl/certs/ca-certificates.crt";

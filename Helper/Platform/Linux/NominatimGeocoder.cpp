@@ -22,6 +22,7 @@ using Response = std::shared_ptr<vlu::Http::HttpResponse>;
 
 constexpr int kStatusOk = 200;
 constexpr std::size_t kLargestAnswer = std::size_t{256} << 10;
+constexpr const char* kLate = "the geocoder did not answer in time";
 
 /// Territories that have a country code of their own besides the subdivision code (ISO 3166-2) of
 /// the state that they belong to, and that services report under that state.
@@ -30,7 +31,7 @@ constexpr std::string_view kTerritories[] = {"CN-HK", "CN-MO", "FR-BL", "FR-GF",
                                              "FR-WF", "FR-YT", "NL-AW", "NL-CW", "NL-SX", "US-AS",
                                              "US-GU", "US-MP", "US-PR", "US-UM", "US-VI"};
 
-/// Where answers arrive. Never destroyed: one may arrive long after the look-up gave it up.
+/// Where answers arrive. Never destroyed: one may arrive after the look-up gave it up.
 WorkQueue& AnswerQueue() {
   static auto* queue = new WorkQueue("com.zarvo.halvec.geocoder.answers");
   return *queue;
@@ -100,16 +101,22 @@ GeocodeAnswer Read(std::string_view text) {
 }
 
 GeocodeAnswer Read(vlu::Http::HttpResponse& response) {
-  if (response.errorType() != vlu::Http::ErrorType::kSuccess) {
-    return GeocodeError{std::string("the geocoder cannot be asked: ") +
-                        vlu::Http::asString(response.errorType())};
+  switch (response.errorType()) {
+    case vlu::Http::ErrorType::kSuccess:
+      break;
+    case vlu::Http::ErrorType::kTimedOut:
+      return GeocodeError{kLate};
+    case vlu::Http::ErrorType::kTooLarge:
+      return GeocodeError{"the geocoder's answer is too long"};
+    default:
+      return GeocodeError{std::string("the geocoder cannot be asked: ") +
+                          vlu::Http::asString(response.errorType())};
   }
   if (response.statusCode() != kStatusOk) {
     return GeocodeError{"the geocoder answered with status " +
                         std::to_string(response.statusCode())};
   }
   const std::vector<std::uint8_t> body = response.takeBody();
-  if (body.size() > kLargestAnswer) return GeocodeError{"the geocoder's answer is too long"};
   return Read(std::string_view(reinterpret_cast<const char*>(body.data()), body.size()));
 }
 
@@ -126,10 +133,10 @@ GeocodeAnswer NominatimGeocoder::lookUp(const Coordinate& place) {
   request->setCallbackQueue(AnswerQueue());
   request->setCompletionCallback(
       [arrival](Response answer) { arrival->set_value(std::move(answer)); });
+  request->setLimits(limit_, kLargestAnswer);
   request->start("");
-  if (response.wait_for(limit_) != std::future_status::ready) {
-    return GeocodeError{"the geocoder did not answer in time"};
-  }
+  // The transfer ends by itself at about that time, but the look-up of a name may keep it longer.
+  if (response.wait_for(limit_) != std::future_status::ready) return GeocodeError{kLate};
   const Response answer = response.get();
   if (!answer) return GeocodeError{"the system has no means left to ask the geocoder"};
   return Read(*answer);

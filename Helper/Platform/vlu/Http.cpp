@@ -159,9 +159,9 @@ std::shared_ptr<HttpRequest> HttpRequest::create(RequestType type, const std::st
 void HttpRequest::start(const std::string& /*body*/) {
   // A queue of the transfer's own, given up at once: it lives until its work is done.
   platform::WorkQueue transfers("vlu.http");
-  const bool started =
-      transfers.tryAsync([transfer = Transfer{url_, headers_, session_->allowsCellular()},
-                          queue = queue_, callback = callback_] {
+  const bool started = transfers.tryAsync(
+      [transfer = Transfer{url_, headers_, session_->allowsCellular(), duration_, longestBody_},
+       queue = queue_, callback = callback_] {
         DeliverResponse(*queue, callback, platform::Shared<HttpTransport>().retrieve(transfer));
       });
   if (!started) DeliverResponse(*queue_, callback_, nullptr);

@@ -5,13 +5,16 @@
 // at a time and have no lock; the transfer itself runs on a thread of its own.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <limits>
 #include <map>
 #include <memory>
 #include <string>
 #include <vector>
 
+#include "Helper/Platform/Clock.h"
 #include "Helper/Platform/WorkQueue.h"
 
 namespace vlu::Http {
@@ -103,6 +106,14 @@ class HttpRequest {
   void setCallbackQueue(platform::WorkQueue& queue) { queue_ = &queue; }
   void setCompletionCallback(CompletionCallback callback) { callback_ = std::move(callback); }
 
+  /// Ends transfers that are started from now on with kTimedOut when `duration` has passed, and
+  /// with kTooLarge when the body exceeds `longestBody` bytes, where that is less than the library
+  /// allows.
+  void setLimits(platform::Duration duration, std::size_t longestBody) {
+    duration_ = duration;
+    longestBody_ = longestBody;
+  }
+
   /// Starts the transfer and returns. The callback runs exactly once per start, in bounded time
   /// whatever the server does; with an empty pointer, and perhaps inside this call, where the
   /// system refuses the transfer a thread. A retrieval has no body: `body` is not sent. Needs queue
@@ -115,6 +126,8 @@ class HttpRequest {
   std::string url_;
   HeaderMap headers_;
   std::shared_ptr<HttpSession> session_;
+  platform::Duration duration_ = platform::Duration::max();
+  std::size_t longestBody_ = std::numeric_limits<std::size_t>::max();
   platform::WorkQueue* queue_ = nullptr;
   CompletionCallback callback_;
 };

@@ -3,9 +3,12 @@
 // What carries HTTP requests: the service below vlu::Http. Any thread; transfers run side by side.
 #pragma once
 
+#include <cstddef>
+#include <limits>
 #include <memory>
 #include <string>
 
+#include "Helper/Platform/Clock.h"
 #include "Helper/Platform/SharedService.h"
 #include "Helper/Platform/vlu/Http.h"
 
@@ -16,6 +19,9 @@ struct Transfer {
   std::string url;    // absolute, http or https
   HeaderMap headers;  // to send besides Host and Accept
   bool allowsCellular = true;
+  // Where these are less than what the transport allows every transfer:
+  platform::Duration limit = platform::Duration::max();  // for all of it, redirects included
+  std::size_t longestBody = std::numeric_limits<std::size_t>::max();
 };
 
 class HttpTransport {
