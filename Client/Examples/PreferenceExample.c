@@ -1,10 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// Stores a preference value and reads it back. Build: cc example.c -lhalvec_mobile_helper
+// Stores a preference value and reads it back.
+#include <halvec_mobile_helper.h>
 #include <stdio.h>
 #include <string.h>
-
-#include "Client/halvec_mobile_helper.h"
 
 static int fail(const char* what, const hvmh_error* error) {
   char text[256];
