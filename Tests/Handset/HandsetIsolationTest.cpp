@@ -103,6 +103,16 @@ TEST_F(HandsetIsolation, KeepsItsDataInAStateFolder) {
   EXPECT_EQ(second.output, "kept\ndomain\nmobile\nmobile\n") << second.errors;
 }
 
+TEST_F(HandsetIsolation, KeepsTheHelpersHomeAndTokensInAStateFolder) {
+  const TemporaryFolder folder;
+  const Outcome first = RunHandset("echo domain > /root/p; echo token > " TOKEN_FOLDER "/t",
+                                   {"--state", folder.path()});
+  const Outcome second = RunHandset(
+      "cat /root/p " TOKEN_FOLDER "/t; stat -c %a /root " TOKEN_FOLDER, {"--state", folder.path()});
+  EXPECT_EQ(first.status, 0) << first.errors;
+  EXPECT_EQ(second.output, "domain\ntoken\n700\n755\n") << second.errors;
+}
+
 TEST_F(HandsetIsolation, LeavesNoMountOnTheHost) {
   const std::string before = handset::ReadWholeFile("/proc/self/mountinfo");
   EXPECT_EQ(RunHandset("caller call x >/dev/null").status, 0);
@@ -120,6 +130,14 @@ TEST_F(HandsetIsolation, LeavesNoMountOnAHostWhoseMountsAreShared) {
       "shared", "before=$(cat /proc/self/mountinfo); " HANDSET " run --helper " FAKE_HELPER
                 " true && [ \"$before\" = \"$(cat /proc/self/mountinfo)\" ] && echo same");
   EXPECT_EQ(run.output, "same\n") << run.errors;
+}
+
+TEST_F(HandsetIsolation, DoesNotShowTheHostsVoicemailTokens) {
+  const Outcome run = RunAsideFromTheHost(
+      "private", "mount -t tmpfs none /var/lib && mkdir -p /var/lib/halvec " TOKEN_FOLDER
+                 " && touch " TOKEN_FOLDER "/host && " HANDSET " run --helper " FAKE_HELPER
+                 " sh -c 'touch " TOKEN_FOLDER "/own; ls " TOKEN_FOLDER "'");
+  EXPECT_EQ(run.output, "own\n") << run.errors;
 }
 
 TEST_F(HandsetIsolation, ShowsWhatTheHostHasMountedBelowALayeredFolder) {

@@ -12,6 +12,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cstdlib>
 #include <memory>
 #include <string_view>
 #include <utility>
@@ -70,24 +71,36 @@ PendingTree Take(const std::string& hostPath, std::string inside, Access access)
   return {CloneTree(hostPath, access), std::move(inside), S_ISDIR(facts.st_mode)};
 }
 
-/// The folders of `directory` that keep the mobile user's home, the any-user preferences and the
-/// services' own data from one run to the next; made on first use.
+/// A folder of the handset that holds data: in memory, or in the state folder of the host.
+struct DataFolder {
+  const char* name;  ///< In the state folder.
+  std::string inside;
+  const char* mode;
+  uid_t owner;
+  gid_t group;
+};
+
+/// The homes of the mobile user and of the helper, which is root here, the any-user preferences,
+/// the services' own data and the voicemail tokens, whose folder the helper closes itself.
+std::vector<DataFolder> DataFolders() {
+  const std::string tokenStore = HALVEC_TOKEN_STORE;
+  return {{"mobile", "/var/mobile", "755", kMobileUser, kMobileGroup},
+          {"Library", "/Library", "755", 0, 0},
+          {"lib-halvec", "/var/lib/halvec", "755", 0, 0},
+          {"root", "/root", "700", 0, 0},
+          {"tokens", tokenStore.substr(0, tokenStore.find_last_of('/')), "755", 0, 0}};
+}
+
+/// Takes each data folder from `directory`, so that it outlives the run; made on first use.
 void TakeState(const std::string& directory, FromHost& host) {
-  struct Kept {
-    const char* name;
-    const char* inside;
-    uid_t owner;
-  };
-  constexpr std::array<Kept, 3> kKept{Kept{"mobile", "/var/mobile", kMobileUser},
-                                      Kept{"Library", "/Library", 0},
-                                      Kept{"lib-halvec", "/var/lib/halvec", 0}};
   std::unique_ptr<char, decltype(&std::free)> resolved(realpath(directory.c_str(), nullptr),
                                                        &std::free);
   if (!resolved) throw Failure::FromErrno("--state " + directory);
-  for (const Kept& kept : kKept) {
+  for (const DataFolder& kept : DataFolders()) {
     const std::string path = std::string(resolved.get()) + "/" + kept.name;
-    if (mkdir(path.c_str(), 0755) == 0) {
-      if (chmod(path.c_str(), 0755) != 0 || chown(path.c_str(), kept.owner, kept.owner) != 0) {
+    const auto mode = static_cast<mode_t>(std::strtoul(kept.mode, nullptr, 8));
+    if (mkdir(path.c_str(), mode) == 0) {
+      if (chmod(path.c_str(), mode) != 0 || chown(path.c_str(), kept.owner, kept.group) != 0) {
         throw Failure::FromErrno("prepare " + path);
       }
     } else if (errno != EEXIST) {
@@ -232,15 +245,14 @@ void BuildFolders(const FromHost& host) {
   MountMemory("/tmp", "1777");
   MountMemory("/run", "755");
   MakeDirectories("/run/lock");
-  MountMemory("/root", "700");
   MakeDirectories("/private");
   // A link and not a second mount: a rename from one name of the folder to the other must work.
   MakeLink("../var", "/private/var");
   MakeDirectories("/var/empty");
   if (host.state.empty()) {
-    MountMemory("/var/mobile", "755", kMobileUser, kMobileGroup);
-    MountMemory("/Library", "755");
-    MountMemory("/var/lib/halvec", "755");
+    for (const DataFolder& folder : DataFolders()) {
+      MountMemory(folder.inside, folder.mode, folder.owner, folder.group);
+    }
   }
   for (const PendingTree& kept : host.state) AttachCreating(kept);
   MakeDirectories("/Library/Preferences");

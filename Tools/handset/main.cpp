@@ -27,13 +27,15 @@ constexpr const char* kUsage = R"(usage: handset run [OPTION]... [--] COMMAND [A
 Runs COMMAND in a simulated handset, in which the helper starts on demand, and
 ends with COMMAND's exit status. Needs root; leaves nothing behind.
 
-  --helper PATH       the helper to run (default: the one built beside this tool)
+  --helper PATH       the helper to run (default: the one built beside this tool,
+                      else the one that is installed)
   --verbose           show log lines and helper starts on standard error
   --log FILE          append the system log to FILE, one JSON object per line
   --events FILE       append helper starts and exits to FILE, likewise
   --user NAME         run COMMAND as this user (default: root)
   --env-as USER       give COMMAND a clean environment of this user
-  --state DIR         keep /var/mobile, /Library and /var/lib/halvec in DIR
+  --state DIR         keep the mobile user's home, preferences, voicemail tokens
+                      and services' data in DIR
   --bind SRC[:DST]    show SRC of the host, writable, at DST (default: as SRC)
   --install SRC[:NAME]  copy an executable to /usr/libexec/halvec/NAME
   --web DIR           serve DIR by https, where only this handset trusts the server
