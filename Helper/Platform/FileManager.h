@@ -65,7 +65,8 @@ class FileManager {
   [[nodiscard]] virtual std::optional<std::uint32_t> mode(const std::string& path) = 0;
 
   /// Everything below the directory, relative to it, a directory before what it holds. Links are
-  /// listed, not entered; what cannot be read is listed without what is in it.
+  /// listed, not entered; what cannot be read is listed without what is in it, and so are the
+  /// directories 200 levels below.
   [[nodiscard]] virtual std::vector<std::string> subpaths(const std::string& path) = 0;
 
   /// Makes a directory with exactly these attributes, whatever the process's umask. With

@@ -223,6 +223,30 @@ TEST_F(FileManagerPosix, LeavesOutAFileAloneWhoseAttributesHaveNoRoomThere) {
   EXPECT_EQ(manager.kind(at("small/a")), FileKind::kAbsent);
 }
 
+TEST_F(FileManagerPosix, KeepsAFolderWhoseAttributesHaveNoRoomThere) {
+  folder.folder("tree");
+  folder.folder("small");
+  const SmallFileSystem source(at("tree"));
+  const SmallFileSystem small(at("small"), "size=256k,nr_inodes=8");
+  if (!source || !small) {
+    GTEST_SKIP() << "no file system can be mounted here: " << std::strerror(errno);
+  }
+  folder.folder("tree/sub");
+  folder.file("tree/sub/file", "text");
+  const timespec times[2] = {{.tv_sec = 1000, .tv_nsec = 0}, {.tv_sec = 2000, .tv_nsec = 0}};
+  ASSERT_EQ(::utimensat(AT_FDCWD, at("tree/sub").c_str(), times, 0), 0);
+  const std::string value(9000, 'x');
+  if (::setxattr(at("tree/sub").c_str(), "user.large", value.data(), value.size(), 0) != 0) {
+    GTEST_SKIP() << "this kernel keeps no attributes in memory: " << std::strerror(errno);
+  }
+  EXPECT_EQ(copy(at("tree"), at("small/copy")), E2BIG);
+  EXPECT_EQ(folder.text("small/copy/sub/file"), "text");
+  struct stat status {};
+  ASSERT_EQ(::stat(at("small/copy/sub").c_str(), &status), 0);
+  EXPECT_EQ(status.st_mode & 07777U, 0755U);
+  EXPECT_EQ(status.st_mtim.tv_sec, 2000);
+}
+
 TEST_F(FileManagerPosix, MovesToAnotherFileSystemAllOrNothing) {
   folder.folder("other");
   const SmallFileSystem other(at("other"));

@@ -13,6 +13,49 @@ namespace {
 constexpr std::uint32_t kUid = 501;
 constexpr std::uint32_t kGid = 502;
 
+/// Fails to copy the item with this subpath, and does all else.
+class FailsAtOne final : public platform::FileManager {
+ public:
+  FailsAtOne(fakes::FakeFileManager& real, std::string subpath)
+      : real_(real), subpath_(std::move(subpath)) {}
+  platform::FileKind kind(const platform::FilePlace& place) override { return real_.kind(place); }
+  std::optional<std::uint32_t> mode(const std::string& path) override { return real_.mode(path); }
+  std::vector<std::string> subpaths(const std::string& path) override {
+    return real_.subpaths(path);
+  }
+  bool createDirectory(const platform::FilePlace& place, bool intermediates,
+                       const platform::FileAttributes& attributes,
+                       platform::FileError* error) override {
+    return real_.createDirectory(place, intermediates, attributes, error);
+  }
+  bool copyItem(const platform::FilePlace& source, const platform::FilePlace& destination,
+                platform::FileError* error) override {
+    if (destination.subpath == subpath_) return false;
+    return real_.copyItem(source, destination, error);
+  }
+  bool moveItem(const platform::FilePlace& source, const platform::FilePlace& destination,
+                platform::FileError* error) override {
+    return real_.moveItem(source, destination, error);
+  }
+  bool removeItem(const platform::FilePlace& place, platform::FileError* error) override {
+    return real_.removeItem(place, error);
+  }
+  bool removeEmptyDirectory(const std::string& path) override {
+    return real_.removeEmptyDirectory(path);
+  }
+  bool setAttributes(const platform::FileAttributes& attributes, const platform::FilePlace& place,
+                     platform::FileError* error) override {
+    return real_.setAttributes(attributes, place, error);
+  }
+  bool changeOwner(const std::string& path, std::uint32_t uid, std::uint32_t gid) override {
+    return real_.changeOwner(path, uid, gid);
+  }
+
+ private:
+  fakes::FakeFileManager& real_;
+  const std::string subpath_;
+};
+
 class FileUtilities : public ::testing::Test {
  protected:
   FileUtilities() {
@@ -141,6 +184,10 @@ TEST_F(FileUtilities, GiveTheSourceItselfToTheOwnerBeforeCopyingToAFreePlace) {
   EXPECT_EQ(files.nodes["/from"].gid, kGid);
   EXPECT_EQ(files.nodes["/from/file"].uid, 0U) << "not what is in it";
   EXPECT_EQ(files.contentOf("/to/copy/file"), "x");
+  EXPECT_EQ(files.nodes["/to/copy"].uid, kUid) << "so that the copy has the owner too";
+  files.nodes["/from"].uid = 0;
+  EXPECT_EQ(move("/from", "/to/moved"), 0);
+  EXPECT_EQ(files.nodes["/to/moved"].uid, kUid);
 }
 
 TEST_F(FileUtilities, AnswerTheCodeOr5WhenTheCopyToAFreePlaceFails) {
@@ -225,12 +272,16 @@ TEST_F(FileUtilities, MergeADirectoryIntoOneOfItsName) {
   files.addFile("/to/from/kept", "kept");
   files.addDirectory("/to/from/sub");
   files.addDirectory("/to/from/clash");
+  files.addDirectory("/from/held");
+  files.addFile("/from/held/deep", "deep");
+  files.addFile("/to/from/held", "file under a directory");
   EXPECT_EQ(copy("/from", "/to"), 0) << "even if single items failed";
   EXPECT_EQ(files.contentOf("/to/from/same"), "new");
   EXPECT_EQ(files.contentOf("/to/from/own"), "own");
   EXPECT_EQ(files.contentOf("/to/from/kept"), "kept");
   EXPECT_EQ(files.contentOf("/to/from/sub/deep"), "deep");
   EXPECT_TRUE(files.subpaths("/to/from/clash").empty());
+  EXPECT_EQ(files.contentOf("/to/from/held"), "file under a directory");
   EXPECT_EQ(files.contentOf("/from/same"), "new") << "the source of a copy stays";
 }
 
@@ -265,47 +316,35 @@ TEST_F(FileUtilities, MakeTheParentOfAnItemWhoseDirectoryCouldNotBeCopied) {
   files.addFile("/from/sub/file", "x");
   files.addDirectory("/to/from");
   // The directory itself fails to copy as a whole, and is then made for what is in it.
-  class FailsOnce final : public platform::FileManager {
-   public:
-    explicit FailsOnce(fakes::FakeFileManager& real) : real_(real) {}
-    platform::FileKind kind(const platform::FilePlace& place) override { return real_.kind(place); }
-    std::optional<std::uint32_t> mode(const std::string& path) override { return real_.mode(path); }
-    std::vector<std::string> subpaths(const std::string& path) override {
-      return real_.subpaths(path);
-    }
-    bool createDirectory(const platform::FilePlace& place, bool intermediates,
-                         const platform::FileAttributes& attributes,
-                         platform::FileError* error) override {
-      return real_.createDirectory(place, intermediates, attributes, error);
-    }
-    bool copyItem(const platform::FilePlace& source, const platform::FilePlace& destination,
-                  platform::FileError* error) override {
-      if (destination.subpath == "sub") return false;
-      return real_.copyItem(source, destination, error);
-    }
-    bool moveItem(const platform::FilePlace& source, const platform::FilePlace& destination,
-                  platform::FileError* error) override {
-      return real_.moveItem(source, destination, error);
-    }
-    bool removeItem(const platform::FilePlace& place, platform::FileError* error) override {
-      return real_.removeItem(place, error);
-    }
-    bool removeEmptyDirectory(const std::string& path) override {
-      return real_.removeEmptyDirectory(path);
-    }
-    bool setAttributes(const platform::FileAttributes& attributes, const platform::FilePlace& place,
-                       platform::FileError* error) override {
-      return real_.setAttributes(attributes, place, error);
-    }
-    bool changeOwner(const std::string& path, std::uint32_t uid, std::uint32_t gid) override {
-      return real_.changeOwner(path, uid, gid);
-    }
-
-   private:
-    fakes::FakeFileManager& real_;
-  } failing(files);
+  FailsAtOne failing(files, "sub");
   MergeItem(failing, "/from", "/to/from", /*copy=*/true);
   EXPECT_EQ(files.contentOf("/to/from/sub/file"), "x");
+  EXPECT_EQ(files.nodes["/to/from/sub"].mode, 0040755U) << "no permissions of its own";
+}
+
+TEST_F(FileUtilities, TakeABaseNameFrom1024BytesOfAPath) {
+  const std::string source = "/" + std::string(1100, 's');
+  files.addFile(source, "x");
+  EXPECT_EQ(copy(source, "/to"), 0);
+  EXPECT_EQ(files.contentOf("/to/" + std::string(1023, 's')), "x");
+}
+
+TEST_F(FileUtilities, TakeTheParentOfAnItemFrom1024BytesOfItsPath) {
+  const std::string outer(500, 'a');
+  const std::string inner = outer + '/' + std::string(600, 'b');
+  files.addDirectory("/from/" + outer);
+  files.addDirectory("/from/" + inner);
+  files.addFile("/from/" + inner + "/file", "x");
+  files.addDirectory("/to/from");
+  FailsAtOne failing(files, outer);
+  MergeItem(failing, "/from", "/to/from", /*copy=*/true);
+  EXPECT_TRUE(exists("/to/from/" + outer)) << "the parent as far as the bytes go";
+  EXPECT_EQ(files.contentOf("/to/from/" + inner + "/file"), "x") << "copied with its directory";
+  files.nodes.erase("/to/from/" + inner + "/file");
+  files.nodes.erase("/to/from/" + inner);
+  FailsAtOne failingDeeper(files, inner);
+  MergeItem(failingDeeper, "/from", "/to/from", /*copy=*/true);
+  EXPECT_FALSE(exists("/to/from/" + inner)) << "its parent lies behind the 1024th byte";
 }
 
 TEST_F(FileUtilities, CopyADirectoryAsTheProcessesOwn) {

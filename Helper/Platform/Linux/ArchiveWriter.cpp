@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <climits>
 #include <utility>
 
 #include "Helper/Platform/Linux/FileBody.h"
@@ -46,6 +47,7 @@ int MakeRoom(int folder, const char* name) {
 int ArchiveItemPath(std::string_view name, std::string& path) {
   path.clear();
   if (name.starts_with('/')) return EINVAL;
+  int levels = 0;
   while (!name.empty()) {
     const std::string_view component = name.substr(0, name.find('/'));
     name.remove_prefix(std::min(name.size(), component.size() + 1));
@@ -53,6 +55,8 @@ int ArchiveItemPath(std::string_view name, std::string& path) {
     if (component == "..") return EINVAL;
     if (!path.empty()) path += '/';
     path += component;
+    // Nothing is made that the file manager could not remove again.
+    if (++levels > kDeepestLevel || path.size() >= PATH_MAX) return ENAMETOOLONG;
   }
   return 0;
 }

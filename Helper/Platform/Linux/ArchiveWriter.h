@@ -69,7 +69,6 @@ class ArchiveWriter {
  private:
   [[nodiscard]] int openFolderOf(const std::string& path);
   [[nodiscard]] int openOrMakeFolder(std::string_view path);
-  [[nodiscard]] int replaceByFolder(const char* name) const;
 
   FileDescriptor root_;
   // The folder of the last item: items of one folder stand together as a rule.

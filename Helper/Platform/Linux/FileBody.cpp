@@ -160,11 +160,12 @@ int CopyFileAttributes(int from, int to, const struct stat& status) {
       ::fchown(to, status.st_uid, status.st_gid) != 0 && errno != EPERM && errno != EINVAL) {
     return errno;
   }
-  if (const int error = CopyExtendedAttributes(from, to)) return error;
+  // A folder stays even if not all of its attributes have room, so it gets the rest.
+  const int attributes = CopyExtendedAttributes(from, to);
   const mode_t carried = S_ISDIR(status.st_mode) ? 01777 : 0777;
   if (const int error = SetPermissions(to, status.st_mode & carried)) return error;
   const timespec times[2] = {status.st_atim, status.st_mtim};
-  return ::futimens(to, times) == 0 ? 0 : errno;
+  return ::futimens(to, times) == 0 ? attributes : errno;
 }
 
 }  // namespace platform
