@@ -65,6 +65,13 @@ TEST_F(ExtractArchive, ThatIsDamagedLogsOneErrorAndAnswersFalse) {
       << outcome.errors;
 }
 
+TEST_F(ExtractArchive, LeavesOutWhatLiesBelowTooManyFoldersAndMakesNone) {
+  archive("file('d/' * 4000 + 'x')\nfile('good')");
+  const Outcome outcome =
+      extract("halvecctl bundle extract /mnt/a.zip /tmp/to; echo $?; ls -R /tmp/to");
+  EXPECT_EQ(outcome.output, "0\n/tmp/to:\ngood\n") << outcome.errors;
+}
+
 TEST_F(ExtractArchive, ThatCannotBeReadAnswersFalseWithoutALogLineAndTheHelperServesOn) {
   const Outcome outcome = extract(
       "mkfifo /tmp/fifo\n"
