@@ -10,7 +10,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <functional>
 #include <iterator>
+#include <span>
 
 #include "Tests/Fakes/FakeSystemLog.h"
 #include "Tests/Preferences/TemporaryFolder.h"
@@ -233,7 +235,7 @@ TEST_F(PreferenceFilesTest, TakesEmptyTornAndForeignFilesForCorrupt) {
   for (const std::string& text :
        {std::string(), good.substr(0, good.size() / 2), std::string(4096, '\0'),
         std::string("<plist version=\"1.0\"><array/></plist>"),
-        std::string((std::size_t{16} << 20) + 1, ' ')}) {
+        std::string(platform::StoredPreferenceLimits().bytes + 1, ' ')}) {
     fs::remove_all(folder);
     WriteFile(file, text);
     EXPECT_FALSE(stored("key"));
@@ -257,6 +259,32 @@ TEST_F(PreferenceFilesTest, WaitsForNoFifoAndOpensNoDevice) {
   EXPECT_FALSE(stored("key"));
   EXPECT_TRUE(canWrite());
   EXPECT_EQ(ReadFile(folder / "com.zarvo.carrier.plist.corrupt-3/inside"), "kept");
+}
+
+TEST_F(PreferenceFilesTest, HasNothingToRemoveWhereNoRegularFileStands) {
+  fs::create_directories(folder);
+  const std::vector<std::function<void()>> obstacles{
+      [&] { ASSERT_EQ(::mkfifo(file.c_str(), 0600), 0); },
+      [&] { ASSERT_EQ(::mknod(file.c_str(), S_IFSOCK | 0600, 0), 0); },
+      [&] { fs::create_symlink("/dev/zero", file); },
+      [&] { fs::create_symlink(file, file); },
+      [&] { fs::create_symlink("/dev/null/nowhere", file); },
+      [&] { fs::create_directory(file); },
+  };
+  for (const auto& putInPlace : obstacles) {
+    putInPlace();
+    ASSERT_TRUE(fs::exists(fs::symlink_status(file)));
+    PreferenceFiles files = store();
+    files.setValue("key", std::nullopt, domain);
+    EXPECT_TRUE(files.synchronize(domain));
+    EXPECT_FALSE(files.copyValue("other", domain));
+    for (const auto& [priority, line] : log.takeLines()) {
+      EXPECT_EQ(line.find("Preferences file " + file.string() + " is corrupt: "), 0U) << line;
+    }
+    EXPECT_TRUE(files.synchronize(domain));
+    EXPECT_TRUE(log.takeLines().empty());
+    fs::remove(file);
+  }
 }
 
 TEST_F(PreferenceFilesTest, RemovesWhatADeadWriterLeftBehind) {
@@ -290,11 +318,35 @@ TEST_F(PreferenceFilesTest, StoresAValueAtTheDepthLimitAndDropsADeeperOne) {
   EXPECT_TRUE(files.synchronize(domain));
 }
 
+TEST_F(PreferenceFilesTest, StoresEveryValueThatIsAsLargeAsAValueMayBe) {
+  const platform::PropertyListLimits limits;
+  const auto most = platform::SerializeBinary(PropertyList::Array(limits.nodes - 1, true));
+  const auto longest = platform::SerializeBinary(PropertyList::Data(limits.bytes - 64));
+  ASSERT_TRUE(most && longest);
+  // All of it ASCII but for one letter: twice as long in the binary form.
+  const std::string_view head = "<plist version=\"1.0\"><string>\xC3\xA9";
+  const std::string_view tail = "</string></plist>";
+  std::string text(head);
+  text.resize(limits.bytes - tail.size(), 'a');
+  text += tail;
+  for (const auto bytes : {std::span(*most), std::span(*longest), std::as_bytes(std::span(text))}) {
+    const auto value = platform::ParsePropertyList(bytes);
+    ASSERT_TRUE(value);
+    fs::remove_all(folder);
+    PreferenceFiles files = store();
+    const std::string key(255, 'k');
+    files.setValue(key, value, domain);
+    EXPECT_TRUE(files.synchronize(domain));
+    EXPECT_TRUE(stored(key) == value);
+  }
+  EXPECT_TRUE(log.takeLines().empty());
+}
+
 TEST_F(PreferenceFilesTest, DropsAChangeThatWouldOutgrowTheFile) {
   PreferenceFiles files = store();
   files.setValue("small", 1, domain);
   ASSERT_TRUE(files.synchronize(domain));
-  files.setValue("large", PropertyList::Data(std::size_t{16} << 20), domain);
+  files.setValue("large", PropertyList::Data(platform::StoredPreferenceLimits().bytes), domain);
   EXPECT_FALSE(files.synchronize(domain));
   EXPECT_EQ(log.takeLines().size(), 1U);
   EXPECT_TRUE(files.synchronize(domain));

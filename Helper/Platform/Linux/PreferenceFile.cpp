@@ -245,10 +245,14 @@ bool PreferenceFileWriter::replace(const std::vector<std::byte>& bytes) {
 }
 
 bool PreferenceFileWriter::settle() {
-  const FileDescriptor file(
-      ::openat(folder_.get(), path_.name.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
-  if (!file && errno != ENOENT) return fail("open the file", errno);
-  if (file && ::fsync(file.get()) != 0) return fail("fsync the file", errno);
+  struct stat status {};
+  // What is no regular file has nothing of its own to settle, and a device may act on being opened.
+  if (::fstatat(folder_.get(), path_.name.c_str(), &status, 0) == 0 && S_ISREG(status.st_mode)) {
+    const FileDescriptor file(
+        ::openat(folder_.get(), path_.name.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+    if (!file && errno != ENOENT) return fail("open the file", errno);
+    if (file && ::fsync(file.get()) != 0) return fail("fsync the file", errno);
+  }
   return ::fsync(folder_.get()) == 0 ? true : fail("fsync the folder", errno);
 }
 

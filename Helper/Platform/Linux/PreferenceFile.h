@@ -56,10 +56,16 @@ struct PreferenceFileContents {
   std::string reason;  // where corrupt or unreadable
 };
 
-/// What a stored domain may hold: a value at the limits of its own stands one level deeper.
+/// What a stored domain may hold: at least one value at the limits of its own, below the root and a
+/// key. The file may be twice as long as the form that such a value came in, because a text that is
+/// not all ASCII takes two bytes a letter. Only a value that came in a binary form whose references
+/// share long numbers may need still more, since they are written out one by one.
 [[nodiscard]] constexpr PropertyListLimits StoredPreferenceLimits() {
+  constexpr std::size_t kRootAndKey = 1024;  // bytes
   PropertyListLimits limits;
+  limits.bytes = 2 * limits.bytes + kRootAndKey;
   ++limits.depth;
+  limits.nodes += 2;
   return limits;
 }
 
@@ -87,7 +93,8 @@ class PreferenceFileWriter {
   /// failed, and no temporary file is left.
   [[nodiscard]] bool replace(const std::vector<std::byte>& bytes);
 
-  /// Makes what is in place durable, whoever wrote it: fsync of the file and of the folder.
+  /// Makes what is in place durable, whoever wrote it: fsync of the file, where a regular one is
+  /// there, and of the folder. Opens nothing else.
   [[nodiscard]] bool settle();
 
   /// The file's state after a successful replace().
