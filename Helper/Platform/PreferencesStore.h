@@ -39,8 +39,8 @@ class PreferencesStore {
 
   /// Writes the pending changes of `domain` durably and picks up what other processes wrote. False
   /// when a pending change could not be written; the store logs why. It stays pending, unless it
-  /// never can be stored (the domain would exceed what a property list may hold): then the domain's
-  /// pending changes are dropped.
+  /// never can be stored (the domain would exceed what a property list may hold), or changes of
+  /// many megabytes wait already: then the domain's pending changes are dropped.
   virtual bool synchronize(const PreferenceDomain& domain) = 0;
 
   /// The value of `key` as an application sees it: the first found of current user and current

@@ -9,7 +9,7 @@
 #include <thread>
 
 #include "Tests/Fakes/FakeEchoService.h"
-#include "Tests/Heartbeat/LiveAllocations.h"
+#include "Tests/Support/LiveAllocations.h"
 #include "Tests/Support/ServerFixture.h"
 
 namespace {
@@ -224,14 +224,14 @@ TEST_F(HeartbeatRecord, RunsForADayWithoutLeavingAnythingBehind) {
   pass(2s);
   const std::size_t descriptors = support::OpenDescriptors();
   (void)requests();
-  const std::ptrdiff_t allocations = heartbeat_test::LiveAllocations();
+  const std::ptrdiff_t allocations = support::LiveAllocations();
   constexpr int kTicksOfADay = 24 * 60 * 60 / 2;
   int sent = 0;
   for (int tick = 0; tick < kTicksOfADay; ++tick) {
     pass(2s);
     sent += static_cast<int>(requests());
   }
-  EXPECT_EQ(heartbeat_test::LiveAllocations(), allocations);
+  EXPECT_EQ(support::LiveAllocations(), allocations);
   EXPECT_EQ(sent, kTicksOfADay);
   EXPECT_EQ(echo.openSockets(), 0);
   EXPECT_EQ(support::OpenDescriptors(), descriptors);

@@ -16,6 +16,7 @@
 
 #include "Tests/Fakes/FakeSystemLog.h"
 #include "Tests/Preferences/TemporaryFolder.h"
+#include "Tests/Support/LiveAllocations.h"
 
 namespace {
 
@@ -39,6 +40,11 @@ mode_t ModeOf(const fs::path& path) {
   struct stat status {};
   return ::stat(path.c_str(), &status) == 0 ? status.st_mode & 07777 : 0;
 }
+
+constexpr std::size_t kManyTexts = 50'000;
+
+// Small in a file, where equal texts stand once, and large in memory.
+PropertyList ManyTexts() { return PropertyList::Array(kManyTexts, "a text that is allocated"); }
 
 class PreferenceFilesTest : public testing::Test {
  protected:
@@ -365,6 +371,35 @@ TEST_F(PreferenceFilesTest, ServesALargeFileAgainAndAgain) {
   EXPECT_EQ(stored("large"), large);
 }
 
+TEST_F(PreferenceFilesTest, KeepsNoLargeDomainInMemoryOnceItIsWritten) {
+  PreferenceFiles files = store();
+  const PropertyList large = ManyTexts();
+  const std::ptrdiff_t before = support::LiveAllocations();
+  for (int i = 0; i < 8; ++i) {
+    const PreferenceDomain each{"com.zarvo." + std::to_string(i)};
+    files.setValue("large", large, each);
+    ASSERT_TRUE(files.synchronize(each));
+  }
+  EXPECT_LT(support::LiveAllocations() - before, std::ptrdiff_t{kManyTexts});
+}
+
+TEST_F(PreferenceFilesTest, KeepsOneLargeDomainAtMostForTheCopyThatFollows) {
+  for (int i = 0; i < 8; ++i) {
+    PreferenceFiles files = store();
+    const PreferenceDomain each{"com.zarvo." + std::to_string(i)};
+    files.setValue("large", ManyTexts(), each);
+    ASSERT_TRUE(files.synchronize(each));
+  }
+  PreferenceFiles files = store();
+  const std::ptrdiff_t before = support::LiveAllocations();
+  for (int i = 0; i < 8; ++i) {
+    ASSERT_TRUE(files.synchronize(PreferenceDomain{"com.zarvo." + std::to_string(i)}));
+  }
+  EXPECT_LT(support::LiveAllocations() - before, std::ptrdiff_t{2} * kManyTexts);
+  EXPECT_EQ(files.copyValue("large", {"com.zarvo.7"}), ManyTexts());
+  EXPECT_LT(support::LiveAllocations() - before, std::ptrdiff_t{kManyTexts});
+}
+
 TEST_F(PreferenceFilesTest, RemembersManyDomains) {
   PreferenceFiles files = store();
   for (int i = 0; i < 200; ++i) files.setValue("key", i, {"com.zarvo." + std::to_string(i)});
@@ -386,6 +421,27 @@ TEST_F(PreferenceFilesTest, HasNothingForAUserWithoutAHome) {
   EXPECT_FALSE(files.synchronize(domain));
   EXPECT_EQ(log.takeLines().size(), 1U);
   EXPECT_EQ(files.copyValue("key", domain), PropertyList(1));
+}
+
+TEST_F(PreferenceFilesTest, DropsAChangeWhenTooMuchAlreadyWaitsToBeWritten) {
+  PreferenceFiles files({"", temporary.path(), "host"});
+  const PropertyList large(PropertyList::Data(std::size_t{15} << 20, std::byte{1}));
+  for (int i = 0; i < 8; ++i) {
+    const PreferenceDomain each{"com.zarvo." + std::to_string(i)};
+    files.setValue("large", large, each);
+    EXPECT_FALSE(files.synchronize(each));
+    const bool waits = i < 4;
+    EXPECT_EQ(files.copyValue("large", each).has_value(), waits) << i;
+    const auto lines = log.takeLines();
+    ASSERT_EQ(lines.size(), 1U);
+    EXPECT_EQ(lines[0].second.ends_with("; the change is dropped"), !waits) << lines[0].second;
+  }
+  const PreferenceDomain first{"com.zarvo.0"};
+  EXPECT_EQ(files.copyValue("large", first), large);
+  files.setValue("large", std::nullopt, first);
+  files.setValue("small", 1, domain);
+  EXPECT_FALSE(files.synchronize(domain));
+  EXPECT_EQ(files.copyValue("small", domain), PropertyList(1)) << "there is room again";
 }
 
 TEST(SystemPreferenceRoots, FollowTheUserDatabase) {

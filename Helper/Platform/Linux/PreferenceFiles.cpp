@@ -24,9 +24,16 @@ namespace {
 // it was read may have changed once more without looking any different.
 constexpr std::int64_t kStampGrain = 20'000'000;
 
-// Clients name the domains, so the cache forgets what it need not remember.
+// Clients name the domains, so the cache forgets what it need not remember. Values that take more
+// bytes of memory than this are kept for one domain at a time.
 constexpr std::size_t kMostDomainsPerScope = 64;
-constexpr off_t kLargestKeptFile = off_t{1} << 20;
+constexpr std::size_t kLargestKept = std::size_t{1} << 20;
+
+// How many bytes of memory the changes that could not be written may take in all: enough for the
+// largest value.
+constexpr std::size_t kMostWaiting = std::size_t{64} << 20;
+static_assert(PropertyListLimits{}.nodes * sizeof(PropertyList) + PropertyListLimits{}.bytes <
+              kMostWaiting);
 
 struct Scope {
   UserScope user;
@@ -60,6 +67,32 @@ bool IsStored(const PropertyList::Dictionary& values, const Pending& pending) {
     const PropertyList* stored = values.find(change.first);
     return change.second ? stored != nullptr && *stored == *change.second : stored == nullptr;
   });
+}
+
+std::size_t MemoryOf(const PropertyList::Dictionary& values);
+
+// About how many bytes of memory a value takes. Its file may be much shorter: a text that stands in
+// many places is written once.
+std::size_t MemoryOf(const PropertyList& value) {
+  std::size_t bytes = sizeof value;
+  if (const std::string* text = value.string()) {
+    bytes += text->size();
+  } else if (const PropertyList::Data* data = value.data()) {
+    bytes += data->size();
+  } else if (const PropertyList::Array* items = value.array()) {
+    for (const PropertyList& item : *items) bytes += MemoryOf(item);
+  } else if (const PropertyList::Dictionary* entries = value.dictionary()) {
+    bytes += MemoryOf(*entries);
+  }
+  return bytes;
+}
+
+std::size_t MemoryOf(const PropertyList::Dictionary& values) {
+  std::size_t bytes = 0;
+  for (const auto& [key, value] : values) {
+    bytes += sizeof(std::string) + key.size() + MemoryOf(value);
+  }
+  return bytes;
 }
 
 std::string HomeOfEffectiveUser() {
@@ -135,11 +168,26 @@ bool PreferenceFiles::refresh(Domain& domain) {
   PreferenceFileContents contents = ReadPreferenceFile(domain.fullPath);
   domain.stamp = contents.stamp;
   domain.values = std::move(contents.values);
+  domain.large = MemoryOf(domain.values) > kLargestKept;
   domain.corrupt = contents.state == State::kCorrupt;
   domain.loaded = contents.state != State::kUnreadable;
   if (domain.corrupt) report(domain, "corrupt", contents.reason);
   if (!domain.loaded) report(domain, "unreadable", contents.reason);
   return domain.loaded;
+}
+
+void PreferenceFiles::forgetValues(Domain& domain) {
+  domain.loaded = false;
+  domain.large = false;
+  domain.values = {};
+}
+
+void PreferenceFiles::forgetOtherLargeValues(const Domain& domain) {
+  for (auto& domains : domains_) {
+    for (auto& [identifier, other] : domains) {
+      if (other.large && &other != &domain) forgetValues(other);
+    }
+  }
 }
 
 std::optional<PropertyList> PreferenceFiles::copyFrom(Domain& domain, const std::string& key) {
@@ -152,26 +200,42 @@ std::optional<PropertyList> PreferenceFiles::copyFrom(Domain& domain, const std:
   const PropertyList* value = domain.values.find(key);
   std::optional<PropertyList> copy;
   if (value != nullptr) copy = *value;
-  if (domain.stamp.size > kLargestKeptFile) {
-    domain.loaded = false;
-    domain.values = {};
-  }
+  if (domain.large) forgetValues(domain);
   return copy;
 }
 
+std::size_t PreferenceFiles::waitingBytes() const {
+  std::size_t bytes = 0;
+  for (const auto& domains : domains_) {
+    for (const auto& [identifier, domain] : domains) {
+      if (!domain.pending.empty()) bytes += sizeof domain;
+      for (const auto& change : domain.pending) {
+        bytes += sizeof change + change.first.size();
+        if (change.second) bytes += MemoryOf(*change.second);
+      }
+    }
+  }
+  return bytes;
+}
+
+// Logs why the domain's changes could not be written, and leaves them pending while there is room.
+// Always false.
+bool PreferenceFiles::giveUp(Domain& domain, const std::string& reason) {
+  forgetValues(domain);
+  const bool dropped = waitingBytes() > kMostWaiting;
+  if (dropped) domain.pending.clear();
+  Log(LogPriority::kError, "Cannot store preferences in %s: %s%s", domain.fullPath.c_str(),
+      reason.c_str(), dropped ? ", and too much waits already; the change is dropped" : "");
+  return false;
+}
+
 bool PreferenceFiles::write(Domain& domain) {
-  const auto fail = [&domain](const std::string& reason) {
-    domain.loaded = false;
-    Log(LogPriority::kError, "Cannot store preferences in %s: %s", domain.fullPath.c_str(),
-        reason.c_str());
-    return false;
-  };
   PreferenceFileWriter writer(domain.path);
-  if (!writer.begin(patience_)) return fail(writer.reason());
+  if (!writer.begin(patience_)) return giveUp(domain, writer.reason());
   // Another process may have written before the lock was ours.
-  if (!refresh(domain)) return fail("what it holds cannot be read");
+  if (!refresh(domain)) return giveUp(domain, "what it holds cannot be read");
   if (IsStored(domain.values, domain.pending)) {
-    if (!writer.settle()) return fail(writer.reason());
+    if (!writer.settle()) return giveUp(domain, writer.reason());
     domain.durable = domain.stamp;
     domain.pending.clear();
     return true;
@@ -189,15 +253,17 @@ bool PreferenceFiles::write(Domain& domain) {
   if (!bytes) {
     // No later attempt would fare better, and none of the domain's other changes either.
     domain.pending.clear();
-    return fail("more than a property list may hold; the change is dropped");
+    return giveUp(domain, "more than a property list may hold; the change is dropped");
   }
   if (domain.corrupt) writer.keepAside();
-  if (!writer.replace(*bytes)) return fail(writer.reason());
+  if (!writer.replace(*bytes)) return giveUp(domain, writer.reason());
   domain.values = std::move(*merged.dictionary());
   domain.stamp = domain.durable = writer.stamp();
   domain.corrupt = false;
   domain.readAt = NanosecondsOf(CLOCK_REALTIME);
   domain.pending.clear();
+  domain.large = MemoryOf(domain.values) > kLargestKept;
+  if (domain.large) forgetValues(domain);  // a change is no sign that a copy follows
   return true;
 }
 
@@ -209,6 +275,8 @@ bool PreferenceFiles::synchronize(Domain& domain) {
   } else if (!domain.pending.empty()) {
     synchronized = write(domain);
   }
+  // These stay for the copy that usually follows.
+  if (domain.large) forgetOtherLargeValues(domain);
   domain.validatedAt = NanosecondsOf(CLOCK_MONOTONIC_COARSE);
   return synchronized;
 }

@@ -58,6 +58,8 @@ class PreferenceFiles final : public PreferencesStore {
     PreferenceFileStamp stamp;
     std::int64_t readAt = 0;
     PropertyList::Dictionary values;
+    // Whether `values` takes more memory than the cache keeps for every domain.
+    bool large = false;
     // When synchronize() last validated the copy (nanoseconds of CLOCK_MONOTONIC_COARSE).
     std::int64_t validatedAt = 0;
     // The state of the file that is known to survive a power cut.
@@ -72,8 +74,12 @@ class PreferenceFiles final : public PreferencesStore {
   [[nodiscard]] Domain& domainAt(const std::string& identifier, UserScope user, HostScope host);
   [[nodiscard]] std::optional<PropertyList> copyFrom(Domain& domain, const std::string& key);
   [[nodiscard]] bool refresh(Domain& domain);
+  void forgetValues(Domain& domain);
+  void forgetOtherLargeValues(const Domain& domain);
   [[nodiscard]] bool synchronize(Domain& domain);
   [[nodiscard]] bool write(Domain& domain);
+  bool giveUp(Domain& domain, const std::string& reason);
+  [[nodiscard]] std::size_t waitingBytes() const;
   void report(Domain& domain, const char* state, const std::string& reason);
 
   const PreferenceRoots roots_;

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // Replaces the allocation functions of the whole program by counting ones. Any thread.
-#include "Tests/Heartbeat/LiveAllocations.h"
+#include "Tests/Support/LiveAllocations.h"
 
 #include <atomic>
 #include <cstdlib>
@@ -18,11 +18,11 @@ void Release(void* block) noexcept {
 
 }  // namespace
 
-namespace heartbeat_test {
+namespace support {
 
 std::ptrdiff_t LiveAllocations() { return live; }
 
-}  // namespace heartbeat_test
+}  // namespace support
 
 void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
   void* block = std::malloc(size == 0 ? 1 : size);
