@@ -20,7 +20,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <span>
-#include <vector>
 
 namespace platform {
 namespace {
@@ -121,22 +120,28 @@ constexpr auto SortedEntries() {
   return entries;
 }
 
-using Program = std::vector<sock_filter>;
+/// A program while it is written, with room for more than it needs.
+struct Program {
+  std::array<sock_filter, 512> instructions{};
+  std::size_t count = 0;
+
+  constexpr void append(sock_filter instruction) { instructions[count++] = instruction; }
+};
 
 constexpr void Return(Program& program, std::uint32_t verdict) {
-  program.push_back({BPF_RET | BPF_K, 0, 0, verdict});
+  program.append({BPF_RET | BPF_K, 0, 0, verdict});
 }
 
 constexpr void Load(Program& program, std::size_t offset) {
-  program.push_back({BPF_LD | BPF_W | BPF_ABS, 0, 0, static_cast<std::uint32_t>(offset)});
+  program.append({BPF_LD | BPF_W | BPF_ABS, 0, 0, static_cast<std::uint32_t>(offset)});
 }
 
 /// Compares with `value` and skips so many instructions.
 constexpr void Jump(Program& program, std::uint16_t test, std::uint32_t value,
                     std::size_t skippedIfTrue, std::size_t skippedIfFalse) {
-  program.push_back({static_cast<std::uint16_t>(BPF_JMP | BPF_K | test),
-                     static_cast<std::uint8_t>(skippedIfTrue),
-                     static_cast<std::uint8_t>(skippedIfFalse), value});
+  program.append({static_cast<std::uint16_t>(BPF_JMP | BPF_K | test),
+                  static_cast<std::uint8_t>(skippedIfTrue),
+                  static_cast<std::uint8_t>(skippedIfFalse), value});
 }
 
 /// Load, mask, one comparison for each value, two verdicts.
@@ -145,7 +150,7 @@ constexpr std::size_t SizeOf(const Condition& condition) { return condition.valu
 constexpr void Add(Program& program, const Condition& condition) {
   static_assert(std::endian::native == std::endian::little, "the low half of an argument is first");
   Load(program, offsetof(seccomp_data, args) + sizeof(std::uint64_t) * condition.argument);
-  program.push_back({BPF_ALU | BPF_AND | BPF_K, 0, 0, condition.mask});
+  program.append({BPF_ALU | BPF_AND | BPF_K, 0, 0, condition.mask});
   for (std::size_t left = condition.values.size(); const std::uint32_t value : condition.values) {
     Jump(program, BPF_JEQ, value, left--, 0);
   }
@@ -200,8 +205,9 @@ constexpr Program Build() {
 
 /// Made by the compiler, because a start has no time for it.
 constexpr auto kProgram = [] {
-  std::array<sock_filter, Build().size()> program{};
-  std::ranges::copy(Build(), program.begin());
+  constexpr Program kBuilt = Build();
+  std::array<sock_filter, kBuilt.count> program{};
+  std::copy_n(kBuilt.instructions.begin(), program.size(), program.begin());
   return program;
 }();
 
