@@ -1,6 +1,7 @@
 # SPDX-License-Identifier: Apache-2.0
-# What a deployment chooses. The program reads no configuration file and no environment variable,
-# so everything that may differ between two handset distributions is a constant of the build.
+# What a deployment chooses. The program reads no configuration file, and no environment variable but
+# those by which a launcher hands its port over, so everything that may differ between two handset
+# distributions is a constant of the build. Names of the installation are in Install.cmake.
 
 set(HALVEC_PORTS_DIRECTORY "/run/halvec/ports" CACHE STRING
     "Directory that holds the sockets of named message ports")
@@ -30,6 +31,7 @@ option(HALVEC_CONFINE "The helper confines itself at start, as far as its launch
 
 option(HALVEC_BUILD_TESTS "Build the test programs" ON)
 option(HALVEC_BUILD_BENCHMARKS "Build the benchmark programs" ON)
+option(HALVEC_WARNINGS_AS_ERRORS "A compiler's warning ends the build" ON)
 option(HALVEC_BUILD_FUZZERS "Build the fuzz targets (needs clang)" OFF)
 set(HALVEC_SANITIZE "" CACHE STRING "Sanitizers for the whole tree, for example address,undefined")
 if(HALVEC_SANITIZE)

@@ -2,8 +2,11 @@
 # Compiler and linker settings shared by every target.
 
 add_library(ProjectOptions INTERFACE)
-target_compile_options(ProjectOptions INTERFACE -Wall -Wextra -Wconversion -Werror
+target_compile_options(ProjectOptions INTERFACE -Wall -Wextra -Wconversion
                        -fstack-protector-strong -ffunction-sections -fdata-sections)
+if(HALVEC_WARNINGS_AS_ERRORS)
+  target_compile_options(ProjectOptions INTERFACE -Werror)
+endif()
 if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
   # GCC 12 sees overlapping copies in its own string concatenation that cannot happen (PR 105651).
   target_compile_options(ProjectOptions INTERFACE $<$<COMPILE_LANGUAGE:CXX>:-Wno-restrict>)
