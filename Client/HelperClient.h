@@ -66,7 +66,7 @@ class HelperClient {
     if (const Error error = request.encode(arguments); error.failed()) return error;
     std::array<std::byte, Row::kMaxReplySize> reply;
     Data data;
-    const ReplyShape shape{Row::kId + wire::kReplyIdDistance, Row::kReplySize, Row::kComplexReply};
+    const ReplyShape shape{wire::ReplyId(Row::kId), Row::kReplySize, Row::kComplexReply};
     if (const Error error = exchange(request.message, request.outOfLine, shape, reply, data);
         error.failed()) {
       return error;

@@ -120,7 +120,7 @@ Error ReadConnectReply(const std::byte* reply, IncomingPacket& packet, FileDescr
   constexpr Error kIllFormed{HVMH_PROTOCOL_VIOLATION};
   if (packet.length < wire::kErrorReplySize) return kIllFormed;
   const auto header = wire::Load<wire::MessageHeader>(reply);
-  if (header.id != wire::kConnectId + wire::kReplyIdDistance) return kIllFormed;
+  if (header.id != wire::ReplyId(wire::kConnectId)) return kIllFormed;
   if (header.size != packet.length) return kIllFormed;
   if ((header.bits & wire::kComplexBit) == 0) {
     if (header.size != wire::kErrorReplySize) return kIllFormed;

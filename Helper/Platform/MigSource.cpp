@@ -66,8 +66,8 @@ struct MigRunLoopSource::Watch : DescriptorWatch {
 
 void PrepareReply(const wire::MessageHeader& request, std::byte* reply, std::uint32_t replySize) {
   std::fill_n(reply, std::max(replySize, wire::kErrorReplySize), std::byte{0});
-  wire::Store(reply, wire::MessageHeader{.size = wire::kErrorReplySize,
-                                         .id = request.id + wire::kReplyIdDistance});
+  wire::Store(reply,
+              wire::MessageHeader{.size = wire::kErrorReplySize, .id = wire::ReplyId(request.id)});
   wire::StoreReturnCode(reply, MIG_BAD_ID);
 }
 

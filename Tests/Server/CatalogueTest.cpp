@@ -92,7 +92,7 @@ class RequestWire : public support::ServerFixture {
   static Bytes errorReply(std::int32_t id, std::int32_t code) {
     Bytes reply(36);
     Put(reply, 4, 36);
-    Put(reply, 20, id + 100);
+    Put(reply, 20, static_cast<std::uint32_t>(id) + 100);
     reply[28] = 1;
     Put(reply, 32, code);
     return reply;
@@ -137,7 +137,7 @@ TEST_F(RequestWire, WhoseHeaderLiesAboutItsSizeGetsMinus304) {
 }
 
 TEST_F(RequestWire, WithAnUnknownIdGetsMinus303) {
-  for (const std::int32_t id : {8683548, 8683572, 4792174, 0}) {
+  for (const std::int32_t id : {8683548, 8683572, 4792174, 0, -1, INT32_MIN, INT32_MAX}) {
     EXPECT_EQ(send(support::Message(id, 24)).bytes, errorReply(id, -303)) << id;
   }
 }

@@ -109,12 +109,12 @@ TEST_F(ConnectWire, OfAnUnknownSenderGetsMinus309) {
 }
 
 TEST_F(ConnectWire, WithAnyOtherIdOnTheServicePortGetsMinus303) {
-  for (const std::int32_t id : {4792173, 4792175, 8683549, 0, -1}) {
+  for (const std::int32_t id : {4792173, 4792175, 8683549, 0, -1, INT32_MIN, INT32_MAX}) {
     Bytes request = support::ConnectRequest();
     Put(request, 20, id);
     const Bytes reply = replyTo(request);
     ASSERT_EQ(reply.size(), 36U) << id;
-    EXPECT_EQ(Get<std::int32_t>(reply, 20), id + 100);
+    EXPECT_EQ(Get<std::uint32_t>(reply, 20), static_cast<std::uint32_t>(id) + 100);
     EXPECT_EQ(Get<std::int32_t>(reply, 32), -303);
     EXPECT_TRUE(support::IsHungUp(client.ownPort.get())) << "the right must be given back";
   }

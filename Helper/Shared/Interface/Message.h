@@ -66,6 +66,10 @@ inline constexpr std::size_t kReplyNdrOffset = 24;
 inline constexpr std::size_t kReplyCodeOffset = 32;
 inline constexpr std::uint32_t kErrorReplySize = 36;
 inline constexpr std::int32_t kReplyIdDistance = 100;
+/// The id of the reply to request `id`. Any sender chooses ids, so the largest wrap around.
+[[nodiscard]] constexpr std::int32_t ReplyId(std::int32_t id) {
+  return static_cast<std::int32_t>(static_cast<std::uint32_t>(id) + kReplyIdDistance);
+}
 
 /// What identifies the sender, as the kernel attested it: eight 32-bit words.
 struct AuditToken {
