@@ -37,11 +37,13 @@ class ScopedRequest {
   ScopedRequest& operator=(const ScopedRequest&) = delete;
 };
 
+bool IsComplex(const std::byte* reply) {
+  return (wire::Load<std::uint32_t>(reply) & wire::kComplexBit) != 0;
+}
+
 /// The code of a finished reply; a complex reply carries none and means success.
 KernReturn CodeOfReply(const std::byte* reply) {
-  const auto bits = wire::Load<std::uint32_t>(reply);
-  return (bits & wire::kComplexBit) != 0 ? KERN_SUCCESS
-                                         : wire::Load<KernReturn>(reply + wire::kReplyCodeOffset);
+  return IsComplex(reply) ? KERN_SUCCESS : wire::Load<KernReturn>(reply + wire::kReplyCodeOffset);
 }
 
 }  // namespace
@@ -143,15 +145,18 @@ KernReturn MigRunLoopSource::answer(ReceiveBuffer& request, bool refused) {
     const ScopedRequest busy(header.id, request.sender());
     if (const MigStub stub = subsystem_.demultiplex(header)) stub(request.message(), reply.data());
   }
-  const KernReturn code = CodeOfReply(reply.data());
+  KernReturn code = CodeOfReply(reply.data());
   if (code == KERN_SUCCESS) request.disownRights();
   const int destination = request.replyRight() ? request.replyRight().get()
                           : named_             ? -1
                                                : socket_->get();
-  if (code != MIG_NO_REPLY) {
-    // A client that does not take its reply has lost it; there is nobody to tell. Without a
-    // destination the reply's own rights and memory are still given back.
-    (void)SendMessage(destination, reply.data());
+  // Without a destination the reply's own rights and memory are still given back.
+  if (code != MIG_NO_REPLY && !SendMessage(destination, reply.data()) && IsComplex(reply.data())) {
+    // What it carries may be all that could not travel. A client that does not take this reply
+    // either has lost it; there is nobody to tell.
+    PrepareReply(header, reply.data(), wire::kErrorReplySize);
+    wire::StoreReturnCode(reply.data(), KERN_RESOURCE_SHORTAGE);
+    if (SendMessage(destination, reply.data())) code = KERN_RESOURCE_SHORTAGE;
   }
   request.clear();
   return code;

@@ -85,9 +85,11 @@ class ReceiveBuffer {
 };
 
 /// Sends the message at `message` (its header's size counts) to `socket`. A port descriptor's name
-/// becomes its send right; an out-of-line descriptor's bytes go behind the message or into a sealed
-/// memfd, and a region marked deallocate is given back whether or not the message could be sent.
-/// False when the other side is gone or does not read.
+/// becomes its send right; an out-of-line descriptor's bytes go behind the message or, where they
+/// do not fit there, into a sealed memfd. A region marked deallocate is given back whether or not
+/// the message could be sent. False, with nothing sent, when the other side is gone or does not
+/// read, when a right is not there, and when a memfd is needed and none is to be had: the bytes are
+/// too many, or the system has no room, or earlier messages lie unread.
 [[nodiscard]] bool SendMessage(int socket, std::byte* message);
 
 }  // namespace platform

@@ -1,10 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <fcntl.h>
+#include <linux/sockios.h>
+#include <sys/ioctl.h>
 #include <sys/mman.h>
 #include <sys/socket.h>
 
 #include <cerrno>
 #include <cstring>
+#include <span>
 
 #include "Helper/Platform/PortMessage.h"
 #include "Helper/Platform/TaskMemory.h"
@@ -13,23 +16,39 @@ namespace platform {
 namespace {
 
 constexpr std::size_t kMaxDescriptors = 2;
+/// A few earlier replies, as the kernel counts them (some 768 bytes for a short packet).
+constexpr int kMaxUnread = 4096;
 constexpr int kSeals = F_SEAL_SHRINK | F_SEAL_GROW | F_SEAL_WRITE | F_SEAL_SEAL;
 
-/// A memfd that holds `size` bytes and can be changed by nobody any more; empty on failure.
-FileDescriptor SealedCopy(const std::byte* bytes, std::size_t size) {
+/// A memfd that holds `bytes` and can be changed by nobody any more; empty on failure.
+FileDescriptor SealedCopy(std::span<const std::byte> bytes) {
   FileDescriptor file(::memfd_create("message", MFD_CLOEXEC | MFD_ALLOW_SEALING));
-  std::size_t done = 0;
-  while (file && done < size) {
-    const ssize_t count = ::write(file.get(), bytes + done, size - done);
+  while (file && !bytes.empty()) {
+    const ssize_t count = ::write(file.get(), bytes.data(), bytes.size());
     if (count < 0 && errno == EINTR) continue;
     if (count <= 0) return {};
-    done += static_cast<std::size_t>(count);
+    bytes = bytes.subspan(static_cast<std::size_t>(count));
   }
   if (file && ::fcntl(file.get(), F_ADD_SEALS, kSeals) != 0) return {};
   return file;
 }
 
-/// A message on its way out: its parts and the descriptors that travel with it.
+/// Whether the receiver is so far behind that it gets no more memory: each memfd that lies unread
+/// in its queue is memory of this process's making that only the receiver can give up.
+bool IsFarBehind(int socket) {
+  int unread = 0;
+  return ::ioctl(socket, SIOCOUTQ, &unread) != 0 || unread > kMaxUnread;
+}
+
+/// What one descriptor of a message carries, as the routine left it.
+struct Carried {
+  std::byte* descriptor = nullptr;
+  bool isPort = false;
+  PortName port = kPortNull;
+  std::span<std::byte> memory;  // a region of ours
+};
+
+/// A packet on its way out: its parts and the descriptors that travel with it.
 struct Outgoing {
   std::array<iovec, 1 + kMaxDescriptors> parts{};
   std::size_t partCount = 0;
@@ -40,40 +59,45 @@ struct Outgoing {
   std::size_t inlineSize = 0;
 };
 
-bool AddPort(std::byte* descriptor, Outgoing& outgoing) {
-  const auto name = wire::Load<PortName>(descriptor);
-  SharedDescriptor port = PortSendDescriptor(name);
+bool AddPort(const Carried& carried, Outgoing& outgoing) {
+  SharedDescriptor port = PortSendDescriptor(carried.port);
   if (!port) return false;
   outgoing.descriptors[outgoing.descriptorCount] = port->get();
   outgoing.ports[outgoing.descriptorCount++] = std::move(port);
-  wire::Store(descriptor, kPortNull);
+  wire::Store(carried.descriptor, kPortNull);
   return true;
 }
 
-bool AddMemory(std::byte* descriptor, Outgoing& outgoing) {
-  const auto address = wire::Load<std::uint64_t>(descriptor);
-  const std::size_t size = wire::Load<std::uint32_t>(descriptor + wire::kOutOfLineCountOffset);
-  auto* bytes = reinterpret_cast<std::byte*>(address);  // NOLINT: a region of ours
+bool AddMemory(int socket, const Carried& carried, std::size_t inlineLimit, Outgoing& outgoing) {
+  const std::span<std::byte> memory = carried.memory;
   std::uint64_t place = 0;
-  if (size > kMaxInlineData - outgoing.inlineSize) {
-    FileDescriptor file = size <= kMaxOutOfLineData ? SealedCopy(bytes, size) : FileDescriptor();
+  if (memory.size() > inlineLimit - outgoing.inlineSize) {
+    if (memory.size() > kMaxOutOfLineData || IsFarBehind(socket)) return false;
+    FileDescriptor file = SealedCopy(memory);
     if (!file) return false;
     place = 1;
     outgoing.descriptors[outgoing.descriptorCount] = file.get();
     outgoing.files[outgoing.descriptorCount++] = std::move(file);
-  } else if (size > 0) {
-    outgoing.parts[outgoing.partCount++] = {.iov_base = bytes, .iov_len = size};
-    outgoing.inlineSize += size;
+  } else if (!memory.empty()) {
+    outgoing.parts[outgoing.partCount++] = {.iov_base = memory.data(), .iov_len = memory.size()};
+    outgoing.inlineSize += memory.size();
   }
-  wire::Store(descriptor, place);
+  wire::Store(carried.descriptor, place);
   return true;
 }
 
-bool Send(int socket, const Outgoing& outgoing) {
+// Never waits: a receiver that does not read loses its message, nobody else loses time.
+constexpr int kSendFlags = MSG_DONTWAIT | MSG_NOSIGNAL;
+
+/// Sends bytes alone: the form of nearly every reply, and the cheaper call. The errno, or 0.
+int SendBytes(int socket, const iovec& bytes) {
+  return ::send(socket, bytes.iov_base, bytes.iov_len, kSendFlags) < 0 ? errno : 0;
+}
+
+/// The errno, or 0.
+int Send(int socket, const Outgoing& outgoing) {
   if (outgoing.descriptorCount == 0 && outgoing.partCount == 1) {
-    // The form of nearly every reply, and the cheaper call.
-    const iovec& part = outgoing.parts.front();
-    return ::send(socket, part.iov_base, part.iov_len, MSG_DONTWAIT | MSG_NOSIGNAL) >= 0;
+    return SendBytes(socket, outgoing.parts.front());
   }
   msghdr header{};
   header.msg_iov = const_cast<iovec*>(outgoing.parts.data());
@@ -89,8 +113,14 @@ bool Send(int socket, const Outgoing& outgoing) {
     entry->cmsg_len = CMSG_LEN(size);
     std::memcpy(CMSG_DATA(entry), outgoing.descriptors.data(), size);
   }
-  // Never waits: a receiver that does not read loses its message, nobody else loses time.
-  return ::sendmsg(socket, &header, MSG_DONTWAIT | MSG_NOSIGNAL) >= 0;
+  return ::sendmsg(socket, &header, kSendFlags) < 0 ? errno : 0;
+}
+
+/// The region that an out-of-line descriptor names.
+std::span<std::byte> RegionOf(const std::byte* descriptor) {
+  const auto address = wire::Load<std::uint64_t>(descriptor);
+  const std::size_t size = wire::Load<std::uint32_t>(descriptor + wire::kOutOfLineCountOffset);
+  return {reinterpret_cast<std::byte*>(address), size};  // NOLINT: a region of ours
 }
 
 /// Gives back what the message hands over, however the sending went.
@@ -106,7 +136,7 @@ class Deallocation {
     constexpr std::size_t kDeallocateOffset = 8;
     if (wire::Load<std::uint8_t>(descriptor + kDeallocateOffset) == 0) return;
     address_ = wire::Load<std::uint64_t>(descriptor);
-    size_ = wire::Load<std::uint32_t>(descriptor + wire::kOutOfLineCountOffset);
+    size_ = RegionOf(descriptor).size();
   }
 
  private:
@@ -114,31 +144,50 @@ class Deallocation {
   std::size_t size_ = 0;
 };
 
+/// Sends a message with what it carries, up to `inlineLimit` out-of-line bytes in the same packet.
+/// The errno, or 0.
+int SendComplex(int socket, const iovec& message, std::span<const Carried> body,
+                std::size_t inlineLimit) {
+  Outgoing outgoing;
+  outgoing.parts[outgoing.partCount++] = message;
+  for (const Carried& carried : body) {
+    const bool added = carried.isPort ? AddPort(carried, outgoing)
+                                      : AddMemory(socket, carried, inlineLimit, outgoing);
+    if (!added) return ENOBUFS;
+  }
+  return Send(socket, outgoing);
+}
+
 }  // namespace
 
 bool SendMessage(int socket, std::byte* message) {
   const auto header = wire::Load<wire::MessageHeader>(message);
-  Outgoing outgoing;
-  outgoing.parts[outgoing.partCount++] = {.iov_base = message, .iov_len = header.size};
-  if ((header.bits & wire::kComplexBit) == 0) return Send(socket, outgoing);
+  const iovec bytes{.iov_base = message, .iov_len = header.size};
+  if ((header.bits & wire::kComplexBit) == 0) return SendBytes(socket, bytes) == 0;
 
+  std::array<Carried, kMaxDescriptors> carried;
   std::array<Deallocation, kMaxDescriptors> handedOver;
   const auto count = wire::Load<std::uint32_t>(message + wire::kDescriptorCountOffset);
   if (count > kMaxDescriptors) return false;
   std::byte* descriptor = message + wire::kFirstDescriptorOffset;
-  bool complete = true;
   for (std::uint32_t index = 0; index < count; ++index) {
+    carried[index].descriptor = descriptor;
     const auto type = wire::Load<std::uint8_t>(descriptor + wire::kDescriptorTypeOffset);
     if (type == wire::kPortDescriptorType) {
-      complete = AddPort(descriptor, outgoing) && complete;
+      carried[index].isPort = true;
+      carried[index].port = wire::Load<PortName>(descriptor);
       descriptor += wire::kPortDescriptorSize;
     } else {
+      carried[index].memory = RegionOf(descriptor);
       handedOver[index].note(descriptor);
-      complete = AddMemory(descriptor, outgoing) && complete;
       descriptor += wire::kOutOfLineDescriptorSize;
     }
   }
-  return complete && Send(socket, outgoing);
+  const std::span<const Carried> body(carried.data(), count);
+  int error = SendComplex(socket, bytes, body, kMaxInlineData);
+  // A system with small socket buffers: what does not fit into a packet fits into memory.
+  if (error == EMSGSIZE) error = SendComplex(socket, bytes, body, 0);
+  return error == 0;
 }
 
 }  // namespace platform

@@ -258,6 +258,29 @@ TEST_F(OutgoingMessage, CarriesMoreInSealedMemory) {
   EXPECT_EQ(memory.regions(), 0);
 }
 
+TEST_F(OutgoingMessage, CarriesInSealedMemoryWhatTheSocketTakesInNoPacket) {
+  const int small = 32 * 1024;
+  ASSERT_EQ(::setsockopt(port.send.get(), SOL_SOCKET, SO_SNDBUF, &small, sizeof small), 0);
+  std::vector<std::byte> message = reply(100'000);
+  ASSERT_TRUE(SendMessage(port.send.get(), message.data()));
+  const support::Packet packet = support::ReceivePacket(port.receive.get());
+  EXPECT_EQ(packet.bytes.size(), 56U);
+  EXPECT_EQ(Get<std::uint64_t>(packet.bytes, 28), 1U);
+  EXPECT_EQ(Get<std::uint32_t>(packet.bytes, 40), 100'000U);
+  ASSERT_EQ(packet.descriptors.size(), 1U);
+  std::string content(100'001, '\0');
+  EXPECT_EQ(::pread(packet.descriptors[0].get(), content.data(), content.size(), 0), 100'000);
+  EXPECT_EQ(content.substr(0, 100'000), std::string(100'000, 'z'));
+  EXPECT_EQ(memory.regions(), 0);
+}
+
+TEST_F(OutgoingMessage, WithMoreThan16MiBIsNotSent) {
+  std::vector<std::byte> message = reply(16 * 1024 * 1024 + 1);
+  EXPECT_FALSE(SendMessage(port.send.get(), message.data()));
+  EXPECT_TRUE(support::ReceivePacket(port.receive.get()).bytes.empty());
+  EXPECT_EQ(memory.regions(), 0);
+}
+
 TEST_F(OutgoingMessage, GivesItsMemoryBackWhenNobodyReceivesIt) {
   port.receive.reset();
   std::vector<std::byte> message = reply(100);

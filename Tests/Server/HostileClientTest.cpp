@@ -8,6 +8,8 @@
 
 #include "Helper/Platform/Port.h"
 #include "Helper/Platform/UnixSocketAddress.h"
+#include "Tests/Fakes/FakePreferencesStore.h"
+#include "Tests/Support/DescriptorLimit.h"
 #include "Tests/Support/ServerFixture.h"
 
 namespace {
@@ -197,6 +199,63 @@ TEST_F(HostileClient, PassingAServicesSocketAsAReplyRightIsNotWrittenTo) {
   EXPECT_TRUE(request(*bad, bytes, {accepted.get()}).bytes.empty());
   EXPECT_TRUE(support::ReceivePacket(accepted.get()).bytes.empty());
   EXPECT_TRUE(support::ReceivePacket(socket.get()).bytes.empty());
+}
+
+/// Clients of a value that no packet has room for.
+class LargeReply : public HostileClient {
+ protected:
+  LargeReply() {
+    store.setValue("key", platform::PropertyList(std::string(kSize, 'v')),
+                   {.identifier = "domain"});
+    Put(copy, 20, 8683556);
+    support::PutText(copy, 32, "domain");
+    support::PutText(copy, 288, "key");
+  }
+  static std::int32_t codeOf(const support::Packet& reply) {
+    return reply.descriptors.empty() ? Get<std::int32_t>(reply.bytes, 32) : 0;
+  }
+
+  static constexpr std::size_t kSize = 200'000;
+  Bytes copy = support::Message(8683556, 544);
+  fakes::FakePreferencesStore store;
+  platform::ScopedReplacement<platform::PreferencesStore> storeReplacement{store};
+};
+
+TEST_F(LargeReply, IsTheShortageWhereItsMemoryCannotBeMade) {
+  EXPECT_EQ(request(*good, copy).descriptors.size(), 1U);
+  ASSERT_EQ(support::SendPacket(good->privatePort.get(), copy), 0);
+  {
+    const support::DescriptorLimit none(0);
+    pump();
+  }
+  Bytes shortage(36);
+  Put(shortage, 4, 36);
+  Put(shortage, 20, 8683656);
+  shortage[28] = 1;
+  Put(shortage, 32, 6);
+  EXPECT_EQ(support::ReceivePacket(good->privatePort.get()).bytes, shortage);
+  EXPECT_EQ(request(*good, copy).descriptors.size(), 1U) << "once there is room again";
+  expectNothingLeaked();
+}
+
+TEST_F(LargeReply, OfWhichManyLieUnreadIsTheShortageAndTakesNoMoreMemory) {
+  for (int index = 0; index < 100; ++index) {
+    ASSERT_EQ(support::SendPacket(bad->privatePort.get(), copy), 0);
+    pump();
+  }
+  std::size_t inMemory = 0;
+  std::size_t shortages = 0;
+  for (;;) {
+    const support::Packet reply = support::ReceivePacket(bad->privatePort.get());
+    if (reply.bytes.empty()) break;
+    inMemory += reply.descriptors.size();
+    if (codeOf(reply) == 6) ++shortages;
+  }
+  EXPECT_GE(inMemory, 2U) << "a client may be a little behind";
+  EXPECT_LE(inMemory, 10U);
+  EXPECT_EQ(inMemory + shortages, 100U) << "every request is answered";
+  EXPECT_EQ(codeOf(request(*bad, copy)), 0) << "for who reads again";
+  expectNothingLeaked();
 }
 
 TEST_F(HostileClient, FloodingTheServicePortWithoutEntitlementLeavesNothingBehind) {
