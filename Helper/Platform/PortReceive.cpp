@@ -25,10 +25,11 @@ std::uint32_t AlignedTrailerOffset(std::uint32_t size) { return (size + 3U) & ~3
 /// Reads a whole sealed memfd. pread leaves the sender's file offset alone, and a copy in own
 /// memory cannot fault or change.
 bool ReadSealed(int descriptor, std::unique_ptr<std::byte[]>& memory, std::size_t size) {
-  struct stat status {};
-  if (::fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode)) return false;
+  // The seals come before the size: only then can the size no longer change.
   const int seals = ::fcntl(descriptor, F_GET_SEALS);
   if (seals < 0 || (seals & kRequiredSeals) != kRequiredSeals) return false;
+  struct stat status {};
+  if (::fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode)) return false;
   if (status.st_size < 0 || static_cast<std::size_t>(status.st_size) != size) return false;
   memory = std::make_unique_for_overwrite<std::byte[]>(size);
   std::size_t done = 0;
@@ -214,6 +215,7 @@ bool ReceiveBuffer::readMemory(std::byte* descriptor, std::size_t& inlineAt, std
     bytes = memory.bytes.get();
   } else if (size > 0) {
     if (size > length - inlineAt) return false;
+    if (inlineAt + size - header().size > kMaxInlineData) return false;
     bytes = message_ + inlineAt;
     inlineAt += size;
   }

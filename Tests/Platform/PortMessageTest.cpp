@@ -173,10 +173,23 @@ TEST_F(PortMessage, Reads128KiBBehindItAndRefusesOneByteMore) {
   bytes.resize(568 + 131072, 'x');
   ASSERT_EQ(receive(bytes), ReceiveStatus::kMessage);
   EXPECT_EQ(memoryText(), std::string(131072, 'x'));
-  bytes = withMemory(4096, 131073, 0);
-  bytes.resize(4096 + 131073, 'x');
-  ASSERT_EQ(receive(bytes), ReceiveStatus::kRefused);
-  EXPECT_EQ(buffer.refusal(), MIG_BAD_ARGUMENTS);
+  for (const std::uint32_t size : {568U, 4096U}) {
+    bytes = withMemory(size, 131073, 0);
+    bytes.resize(size + 131073, 'x');
+    ASSERT_EQ(receive(bytes), ReceiveStatus::kRefused) << size;
+    EXPECT_EQ(buffer.refusal(), MIG_BAD_ARGUMENTS);
+  }
+}
+
+TEST_F(PortMessage, RefusesMemoryOfSeveralDescriptorsBeyond128KiBInAll) {
+  for (const std::uint32_t second : {1U, 2U}) {
+    Bytes bytes = withMemory(60, 131071, 0);
+    Put(bytes, 24, 2U);
+    bytes[55] = 1;
+    Put(bytes, 56, second);
+    bytes.resize(60 + 131071 + second, 'x');
+    EXPECT_EQ(receive(bytes), second == 1 ? ReceiveStatus::kMessage : ReceiveStatus::kRefused);
+  }
 }
 
 TEST_F(PortMessage, ReadsSealedMemoryOfAnySize) {
