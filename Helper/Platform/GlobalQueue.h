@@ -16,7 +16,8 @@ namespace platform {
 void PostToGlobalQueue(std::function<void()> work);
 
 /// For sources of this folder that deliver there. One thread runs it, so that what it delivers and
-/// what is posted never overlap.
+/// what is posted never overlap. The first use throws std::system_error where no thread is to be
+/// had, and the first source where no descriptor is; a later one tries again.
 [[nodiscard]] asio::io_context& GlobalQueueContext();
 
 }  // namespace platform

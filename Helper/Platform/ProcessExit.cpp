@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <asio/io_context.hpp>
 #include <asio/posix/stream_descriptor.hpp>
+#include <system_error>
 #include <utility>
 #include <vector>
 
@@ -41,10 +42,11 @@ void Forget(const ProcessExitSource* source) {
 
 /// The pidfd on the global queue. Opened before the wait, given up on the queue's thread.
 struct ProcessExitSource::Watch {
-  asio::posix::stream_descriptor descriptor{GlobalQueueContext()};
+  explicit Watch(int pidfd) : descriptor(GlobalQueueContext()) { descriptor.assign(pidfd); }
   ~Watch() {
     if (descriptor.is_open()) (void)descriptor.release();
   }
+  asio::posix::stream_descriptor descriptor;
 };
 
 std::shared_ptr<ProcessExitSource> ProcessExitSource::Create(pid_t process, std::uint32_t version) {
@@ -53,11 +55,11 @@ std::shared_ptr<ProcessExitSource> ProcessExitSource::Create(pid_t process, std:
     return nullptr;
   }
   auto source = std::shared_ptr<ProcessExitSource>(new ProcessExitSource(std::move(pidfd)));
-  auto watch = std::make_shared<Watch>();
-  asio::error_code error;
-  watch->descriptor.assign(source->pidfd_.get(), error);
-  if (error) return nullptr;
-  source->watch_ = std::move(watch);
+  try {
+    source->watch_ = std::make_shared<Watch>(source->pidfd_.get());
+  } catch (const std::system_error&) {
+    return nullptr;  // no descriptor or no thread is to be had for the queue
+  }
   return source;
 }
 

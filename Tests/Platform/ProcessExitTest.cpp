@@ -11,6 +11,7 @@
 
 #include "Helper/Platform/GlobalQueue.h"
 #include "Helper/Platform/ProcessIdentity.h"
+#include "Tests/Support/ThreadsRefused.h"
 
 namespace {
 
@@ -128,6 +129,25 @@ TEST_F(ProcessExit, CannotBeWatchedForAProcessThatIsGone) {
 
 TEST_F(ProcessExit, CannotBeWatchedForAnotherProcessThatHasTheIdNow) {
   EXPECT_EQ(ProcessExitSource::Create(process, version + 1), nullptr);
+}
+
+using ProcessExitDeathTest = ProcessExit;
+
+bool CanBeWatched(pid_t process, std::uint32_t version) {
+  return ProcessExitSource::Create(process, version) != nullptr;
+}
+
+bool CanBeWatchedWithoutThreads(pid_t process, std::uint32_t version) {
+  const support::ThreadsRefused refused;
+  return CanBeWatched(process, version);
+}
+
+TEST_F(ProcessExitDeathTest, CannotBeWatchedWhereTheQueueCannotBeMadeAndLaterCan) {
+  // In a process of its own, where the queue has not been made yet.
+  ::testing::FLAGS_gtest_death_test_style = "threadsafe";
+  EXPECT_EXIT(
+      ::_exit(CanBeWatchedWithoutThreads(process, version) || !CanBeWatched(process, version)),
+      ::testing::ExitedWithCode(0), "");
 }
 
 TEST_F(ProcessExit, VersionStaysTheSameWhileTheProcessLives) {
