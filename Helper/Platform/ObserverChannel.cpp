@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <chrono>
 #include <utility>
 
 #include "Helper/Platform/RunLoopCore.h"
@@ -14,6 +15,7 @@ namespace platform {
 namespace {
 
 constexpr int kBacklog = 8;
+constexpr std::chrono::seconds kPause{1};
 
 /// A socket that listens at `path` for its owner and root alone; empty on failure.
 FileDescriptor Listen(const std::string& path) {
@@ -88,15 +90,34 @@ ObserverChannel::ObserverChannel(RunLoop& loop, FileDescriptor socket, Snapshot 
       snapshot_(std::move(snapshot)),
       watch_(std::make_unique<Watch>(loop, *this)) {}
 
-ObserverChannel::~ObserverChannel() { watch_.reset(); }
+ObserverChannel::~ObserverChannel() {
+  if (pause_) pause_->invalidate();
+  watch_.reset();
+}
 
 void ObserverChannel::accept() {
   FileDescriptor connection(
       ::accept4(socket_.get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
-  if (!connection || observers_.size() == kMaxObservers || !BelongsToRoot(connection.get())) return;
+  if (!connection) return pause();
+  if (observers_.size() == kMaxObservers || !BelongsToRoot(connection.get())) return;
   if (!Send(connection.get(), snapshot_())) return;
   auto observer = std::make_unique<Observer>(loop_, *this, std::move(connection));
   if (observer->open(observer->socket.get())) observers_.push_back(std::move(observer));
+}
+
+/// Leaves the socket alone for a while. Without a free descriptor the observer stays in the
+/// socket's queue, and a loop that watched on would do nothing but find it there.
+void ObserverChannel::pause() {
+  watch_->cancel();
+  pause_ = RunLoopTimer::Create(
+      loop_, loop_.now() + kPause,
+      [](RunLoopTimer*, void* context) { static_cast<ObserverChannel*>(context)->resume(); }, this);
+  if (pause_) loop_.add(pause_);
+}
+
+void ObserverChannel::resume() {
+  pause_.reset();
+  if (!watch_->open(socket_.get())) pause();
 }
 
 void ObserverChannel::publish(std::span<const std::byte> event) {

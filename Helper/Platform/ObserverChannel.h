@@ -41,11 +41,14 @@ class ObserverChannel {
   struct Observer;
   ObserverChannel(RunLoop& loop, FileDescriptor socket, Snapshot snapshot);
   void accept();
+  void pause();
+  void resume();
 
   RunLoop& loop_;
   const FileDescriptor socket_;
   const Snapshot snapshot_;
   std::unique_ptr<Watch> watch_;
+  std::shared_ptr<RunLoopTimer> pause_;  // ends it; null while the socket is watched
   std::vector<std::unique_ptr<Observer>> observers_;
 };
 

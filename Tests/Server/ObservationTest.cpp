@@ -12,7 +12,9 @@
 #include <optional>
 
 #include "Helper/Platform/PropertyList.h"
+#include "Helper/Platform/RunLoopCore.h"
 #include "Helper/Platform/WorkQueue.h"
+#include "Tests/Support/DescriptorLimit.h"
 #include "Tests/Support/ServerFixture.h"
 
 namespace {
@@ -34,10 +36,14 @@ class ObservationTest : public support::ServerFixture {
 
   [[nodiscard]] std::string path() const { return (folder / "observer").string(); }
 
-  [[nodiscard]] FileDescriptor connectObserver() {
+  [[nodiscard]] FileDescriptor callObserverSocket() const {
     FileDescriptor socket(::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
     const platform::UnixSocketAddress address(path());
     EXPECT_EQ(::connect(socket.get(), address.get(), address.size()), 0);
+    return socket;
+  }
+  [[nodiscard]] FileDescriptor connectObserver() {
+    FileDescriptor socket = callObserverSocket();
     pumpAll();
     return socket;
   }
@@ -45,6 +51,18 @@ class ObservationTest : public support::ServerFixture {
   /// Observers are served without counting as handled sources.
   void pumpAll() {
     for (int turn = 0; turn < 20; ++turn) (void)loop.run(0);
+  }
+
+  /// How often, of 20 turns while no descriptor is free, the loop finds something to serve: once
+  /// for the observer, and once because a timer was added.
+  [[nodiscard]] int turnsWithoutDescriptors() {
+    const support::DescriptorLimit none(0);
+    int served = 0;
+    for (int turn = 0; turn < 20; ++turn) {
+      loop.core().collect(0);
+      if (loop.core().serveOne()) ++served;
+    }
+    return served;
   }
 
   [[nodiscard]] static std::optional<PropertyList> take(const FileDescriptor& observer) {
@@ -189,6 +207,40 @@ TEST_F(ObservationTest, TurnsAwayMoreObserversThanItHasRoomFor) {
   observers.pop_back();
   pumpAll();
   EXPECT_TRUE(take(connectObserver()));
+}
+
+TEST_F(ObservationTest, LetsAnObserverWaitWhileNoDescriptorIsFreeAndDoesNotSpin) {
+  const FileDescriptor observer = callObserverSocket();
+  EXPECT_LE(turnsWithoutDescriptors(), 2) << "what cannot be taken in must not wake the loop again";
+  pumpAll();
+  EXPECT_FALSE(take(observer));
+  clock.advance(std::chrono::seconds(1));
+  pumpAll();
+  EXPECT_TRUE(take(observer));
+  EXPECT_TRUE(take(connectObserver())) << "the socket is watched as before";
+}
+
+TEST_F(ObservationTest, LetsAnObserverWaitForMoreThanOneSecondToo) {
+  const FileDescriptor observer = callObserverSocket();
+  ASSERT_LE(turnsWithoutDescriptors(), 2);
+  for (int second = 0; second < 3; ++second) {
+    const support::DescriptorLimit none(0);
+    clock.advance(std::chrono::seconds(1));
+    pumpAll();
+  }
+  EXPECT_FALSE(take(observer));
+  clock.advance(std::chrono::seconds(1));
+  pumpAll();
+  EXPECT_TRUE(take(observer));
+}
+
+TEST_F(ObservationTest, EndsWhileAnObserverWaits) {
+  const FileDescriptor observer = callObserverSocket();
+  ASSERT_LE(turnsWithoutDescriptors(), 2);
+  server->observation.reset();
+  clock.advance(std::chrono::seconds(1));
+  pumpAll();
+  EXPECT_TRUE(support::IsHungUp(observer.get()));
 }
 
 TEST_F(ObservationTest, DoesNotDelayTheIdleExit) {
