@@ -3,6 +3,7 @@
 // Check-in of a named service port: handed over by the launcher (sd_listen_fds(3) describes the
 // three variables) or bound by ourselves; then the launcher is told. Main thread, at start-up.
 #include <fcntl.h>
+#include <sys/file.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 
@@ -76,24 +77,71 @@ KernReturn CodeOfErrno() {
              : KERN_FAILURE;
 }
 
-/// Binds the service's socket. A socket that nobody serves any more is replaced.
-KernReturn Bind(const std::string& path, PortEntry& entry) {
-  const UnixSocketAddress address(path);
-  if (!address) return KERN_INVALID_ARGUMENT;
+/// Held by the one process that replaces an abandoned socket. A file of its own, which no other
+/// user can open and so keep locked, and which goes away with the lock.
+class ReplacementLock {
+ public:
+  explicit ReplacementLock(std::string path) : path_(std::move(path)) {
+    constexpr int kFlags = O_RDWR | O_CREAT | O_NOFOLLOW | O_CLOEXEC;
+    do {
+      file_.reset(::open(path_.c_str(), kFlags, S_IRUSR | S_IWUSR));
+      if (file_ && ::flock(file_.get(), LOCK_EX) != 0) file_.reset();
+    } while (file_ && !isInPlace());  // it went away with another's lock meanwhile
+  }
+  ~ReplacementLock() {
+    if (file_) (void)::unlink(path_.c_str());
+  }
+  ReplacementLock(const ReplacementLock&) = delete;
+  ReplacementLock& operator=(const ReplacementLock&) = delete;
 
-  FileDescriptor probe(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  if (!probe) return CodeOfErrno();
-  if (::connect(probe.get(), address.get(), address.size()) == 0) return KERN_NO_ACCESS;
-  if (errno == ECONNREFUSED) (void)::unlink(path.c_str());  // what matters is whether bind succeeds
+  [[nodiscard]] explicit operator bool() const { return static_cast<bool>(file_); }
 
-  FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  if (!socket || !AskForSenders(socket.get())) return CodeOfErrno();
-  // Start-up has one thread, so the mask is nobody else's: mode 0660 from the first moment on.
+ private:
+  [[nodiscard]] bool isInPlace() const {
+    struct stat held {};
+    struct stat found {};
+    return ::fstat(file_.get(), &held) == 0 && ::lstat(path_.c_str(), &found) == 0 &&
+           held.st_dev == found.st_dev && held.st_ino == found.st_ino;
+  }
+
+  const std::string path_;
+  FileDescriptor file_;
+};
+
+/// Binds with mode 0660 from the first moment on.
+bool BindForGroup(const FileDescriptor& socket, const UnixSocketAddress& address) {
+  // Start-up has one thread, so the mask is nobody else's.
   const mode_t mask = ::umask(S_IXUSR | S_IXGRP | S_IRWXO);
   const bool bound = ::bind(socket.get(), address.get(), address.size()) == 0;
-  const KernReturn code = errno == EADDRINUSE ? KERN_NO_ACCESS : CodeOfErrno();
   ::umask(mask);
-  if (!bound) return code;
+  return bound;
+}
+
+/// Whether somebody serves, or may serve, the socket at `address`.
+bool IsServed(const UnixSocketAddress& address) {
+  const FileDescriptor probe(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  return !probe || ::connect(probe.get(), address.get(), address.size()) == 0 ||
+         errno != ECONNREFUSED;
+}
+
+/// Binds the service's socket. A socket that nobody serves any more is replaced.
+KernReturn Bind(const std::string& directory, const std::string& service, PortEntry& entry) {
+  const std::string path = directory + "/" + service;
+  const UnixSocketAddress address(path);
+  if (!address) return KERN_INVALID_ARGUMENT;
+  FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  if (!socket || !AskForSenders(socket.get())) return CodeOfErrno();
+  if (!BindForGroup(socket, address)) {
+    if (errno != EADDRINUSE) return CodeOfErrno();
+    if (IsServed(address)) return KERN_NO_ACCESS;
+    // From the second look to the removal no other process may put its own there. No service's name
+    // begins with a dot.
+    const ReplacementLock lock(directory + "/." + service + ".lock");
+    if (!lock) return CodeOfErrno();
+    if (IsServed(address)) return KERN_NO_ACCESS;
+    (void)::unlink(path.c_str());  // what matters is whether bind succeeds
+    if (!BindForGroup(socket, address)) return errno == EADDRINUSE ? KERN_NO_ACCESS : CodeOfErrno();
+  }
   entry.boundPath = BoundPath(path);
   entry.receive = std::make_shared<const FileDescriptor>(std::move(socket));
   return KERN_SUCCESS;
@@ -144,7 +192,7 @@ KernReturn BootstrapCheckIn(const char* serviceName, PortName& name) {
                     S_IRWXU | S_IRGRP | S_IXGRP | S_IROTH | S_IXOTH);
     }
     (void)::mkdir(directory.c_str(), S_IRWXU | S_IRGRP | S_IXGRP | S_IROTH | S_IXOTH);
-    const KernReturn code = Bind(directory + "/" + serviceName, entry);
+    const KernReturn code = Bind(directory, serviceName, entry);
     if (code != KERN_SUCCESS) return code;
   }
   name = PortInsertEntry(std::move(entry));

@@ -6,10 +6,18 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sched.h>
+#include <signal.h>
 #include <sys/mount.h>
+#include <sys/ptrace.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <sys/wait.h>
+
+#include <algorithm>
+#include <filesystem>
+#include <initializer_list>
+#include <iterator>
 
 #include "Helper/Platform/PortEntry.h"
 #include "Helper/Platform/PortWatcher.h"
@@ -180,6 +188,79 @@ TEST_F(CheckInWithoutLauncher, DoesNotTakeAServedNameButReplacesAnAbandonedOne) 
               (void)PortDeallocate(first);
               if (::rename("/run/away", kOwnPath) != 0) return 4;
               return BootstrapCheckIn("com.example.own", second) == KERN_SUCCESS ? 0 : 5;
+            }),
+            0);
+}
+
+/// A process that checks the service in and is held at the system calls that the test chooses.
+class HeldCheckIn {
+ public:
+  HeldCheckIn() : process_(::fork()) {
+    if (process_ == 0) {
+      ::ptrace(PTRACE_TRACEME, 0, nullptr, nullptr);
+      ::raise(SIGSTOP);
+      PortName name = kPortNull;
+      ::_exit(BootstrapCheckIn("com.example.own", name));
+    }
+    ::waitpid(process_, nullptr, 0);
+    ::ptrace(PTRACE_SETOPTIONS, process_, nullptr, PTRACE_O_EXITKILL | PTRACE_O_TRACESYSGOOD);
+  }
+  ~HeldCheckIn() {
+    ::kill(process_, SIGKILL);
+    ::waitpid(process_, nullptr, 0);
+  }
+  HeldCheckIn(const HeldCheckIn&) = delete;
+  HeldCheckIn& operator=(const HeldCheckIn&) = delete;
+
+  /// Runs on until it is about to make one of `calls`; false when it ended before.
+  bool runTo(std::initializer_list<std::uint64_t> calls) {
+    do {
+      int status = 0;
+      if (::ptrace(PTRACE_SYSCALL, process_, nullptr, nullptr) != 0) return false;
+      if (::waitpid(process_, &status, 0) != process_ || !WIFSTOPPED(status)) return false;
+      if (::ptrace(PTRACE_GET_SYSCALL_INFO, process_, sizeof call_, &call_) <= 0) return false;
+    } while (call_.op != PTRACE_SYSCALL_INFO_ENTRY ||
+             std::find(calls.begin(), calls.end(), call_.entry.nr) == calls.end());
+    return true;
+  }
+  /// Runs on to the end, where it is held alive with what it has bound, and gives the outcome.
+  KernReturn outcome() {
+    if (call_.entry.nr != SYS_exit_group && !runTo({SYS_exit_group})) return KERN_FAILURE;
+    return static_cast<KernReturn>(call_.entry.args[0]);
+  }
+
+ private:
+  const pid_t process_;
+  __ptrace_syscall_info call_{};
+};
+
+TEST_F(CheckInWithoutLauncher, SucceedsForOneOfTwoThatFindTheSameAbandonedSocket) {
+  EXPECT_EQ(InPrivateRun([] {
+              PortName abandoned = kPortNull;
+              if (BootstrapCheckIn("com.example.own", abandoned) != KERN_SUCCESS) return 1;
+              if (::rename(kOwnPath, "/run/away") != 0) return 2;
+              (void)PortDeallocate(abandoned);
+              if (::rename("/run/away", kOwnPath) != 0) return 3;
+              // The first has found that nobody serves the socket, and has not replaced it yet.
+              HeldCheckIn first;
+              if (!first.runTo({SYS_connect}) || !first.runTo({SYS_unlink, SYS_unlinkat})) return 4;
+              HeldCheckIn second;
+              if (!second.runTo({SYS_flock, SYS_exit_group})) return 5;
+              if (first.outcome() != KERN_SUCCESS) return 6;
+              return second.outcome() == KERN_NO_ACCESS ? 0 : 7;
+            }),
+            0);
+}
+
+TEST_F(CheckInWithoutLauncher, LeavesNothingButItsSocketInTheFolder) {
+  EXPECT_EQ(InPrivateRun([] {
+              for (int round = 0; round < 3; ++round) {
+                // The second and the third find what the one before has left behind.
+                if (HeldCheckIn().outcome() != KERN_SUCCESS) return 1;
+                const std::filesystem::directory_iterator entries("/run/halvec/ports");
+                if (std::distance(begin(entries), end(entries)) != 1) return 2;
+              }
+              return 0;
             }),
             0);
 }
