@@ -2,7 +2,6 @@
 //
 // What a connect leaves behind in the server, and what a client's death takes away.
 #include <fcntl.h>
-#include <sys/resource.h>
 #include <sys/wait.h>
 
 #include <future>
@@ -11,6 +10,7 @@
 #include "Helper/Platform/Port.h"
 #include "Helper/Platform/ProcessIdentity.h"
 #include "Helper/Shared/Server/PortToServerMap.h"
+#include "Tests/Support/DescriptorLimit.h"
 #include "Tests/Support/ServerFixture.h"
 
 namespace {
@@ -55,6 +55,29 @@ TEST_F(Connect, WithoutTheEntitlementAnswers35AndLeavesNothingBehind) {
   expectNoTrace(names);
   EXPECT_FALSE(idleTimerIsArmed());
   EXPECT_TRUE(log.takeLines().empty());
+}
+
+TEST_F(Connect, ThatIsRefusedLeavesAnArmedIdleTimerArmed) {
+  connect().reset();
+  pump();
+  ASSERT_TRUE(idleTimerIsArmed());
+  HandleProcessExit(::getpid());  // forget that this very process was let in before
+  security.answer(wire::kRequiredEntitlement, {});
+  support::WireClient stranger(launcher.path());
+  stranger.sendConnect();
+  pump();
+  EXPECT_EQ(Get<std::int32_t>(stranger.takeConnectReply(), 32), 35);
+  EXPECT_TRUE(idleTimerIsArmed()) << "strangers must not keep the helper up";
+
+  support::Bytes illFormed = support::ConnectRequest();
+  illFormed[3] = 0;
+  stranger.sendConnect(illFormed);
+  pump();
+  EXPECT_EQ(Get<std::int32_t>(stranger.takeConnectReply(), 32), -304);
+  EXPECT_TRUE(idleTimerIsArmed());
+  clock.advance(std::chrono::duration<double>(kIdleSeconds));
+  pump();
+  EXPECT_NE(server->stopRequested, 0);
 }
 
 TEST_F(Connect, OfAClientWhosePortIsAlreadyDeadAnswers5AndKeepsTheServiceUp) {
@@ -109,15 +132,12 @@ TEST_F(Connect, AnswersTheAllocationsCodeWhenNoPortCanBeMade) {
   wire::AuditToken token;
   token.words[5] = static_cast<std::uint32_t>(::getpid());
   ASSERT_TRUE(CallerHasEntitlement(wire::kRequiredEntitlement, token));
-  rlimit limit{};
-  ASSERT_EQ(::getrlimit(RLIMIT_NOFILE, &limit), 0);
-  const rlimit none{.rlim_cur = 0, .rlim_max = limit.rlim_max};
-  ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &none), 0);
   PortName privatePort = 77;
-  const KernReturn code =
-      HelperServerConnectClient(server->servicePort, clientPort, privatePort, token);
-  ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &limit), 0);
-  EXPECT_EQ(code, KERN_RESOURCE_SHORTAGE);
+  {
+    const support::DescriptorLimit none(0);
+    EXPECT_EQ(HelperServerConnectClient(server->servicePort, clientPort, privatePort, token),
+              KERN_RESOURCE_SHORTAGE);
+  }
   EXPECT_EQ(privatePort, kPortNull);
   EXPECT_EQ(platform::PortDeallocate(clientPort), KERN_SUCCESS);
 }

@@ -2,10 +2,12 @@
 //
 // Creation and its failures, run, teardown, the port-to-server map.
 #include <fcntl.h>
-#include <sys/resource.h>
+
+#include <optional>
 
 #include "Helper/Platform/Port.h"
 #include "Helper/Shared/Server/PortToServerMap.h"
+#include "Tests/Support/DescriptorLimit.h"
 #include "Tests/Support/ServerFixture.h"
 
 namespace {
@@ -45,6 +47,28 @@ TEST_F(Lifecycle, CreationFailsWithOneLineWhenTheHandedOverDescriptorIsNoService
   ::setenv("LISTEN_FDNAMES", (names + wire::kServiceName).c_str(), 1);
   EXPECT_EQ(HelperServerCreate(wire::kServiceName, &RequestSubsystem()), nullptr);
   EXPECT_EQ(log.takeLines().size(), 1U);
+}
+
+TEST_F(Lifecycle, CreationFailsWithOneLineWhenTheLoopCannotWatchTheServicePort) {
+  auto none = std::make_optional<support::DescriptorLimit>(0);
+  platform::RunLoop blind(clock);  // without the descriptors that a loop watches with
+  none.reset();
+  const platform::ScopedCurrentRunLoop blindIsCurrent(blind);
+  PortName before = kPortNull;
+  ASSERT_EQ(platform::PortAllocate(before), KERN_SUCCESS);
+  const std::size_t names = platform::PortNameCount();
+
+  EXPECT_EQ(HelperServerCreate(wire::kServiceName, &RequestSubsystem()), nullptr);
+  using Lines = std::vector<fakes::FakeSystemLog::Line>;
+  EXPECT_EQ(log.takeLines(),
+            (Lines{{LogPriority::kError, "unable to create server objects - out of resources"}}));
+  EXPECT_EQ(platform::PortNameCount(), names);
+  PortName after = kPortNull;
+  ASSERT_EQ(platform::PortAllocate(after), KERN_SUCCESS);
+  EXPECT_EQ(after, before + 2) << "one name lies between: the service had been checked in";
+  EXPECT_EQ(HelperServerForPort(before + 1), nullptr);
+  EXPECT_EQ(platform::PortDropReceiveRight(before), KERN_SUCCESS);
+  EXPECT_EQ(platform::PortDropReceiveRight(after), KERN_SUCCESS);
 }
 
 TEST_F(Lifecycle, RunAfterAStopReturnsZeroWithoutRunningTheLoop) {
