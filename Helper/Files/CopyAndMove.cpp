@@ -27,7 +27,7 @@ std::string CrashLogDirectory() {
 
 /// Gives the item to the mobile user.
 /// Kept: as chown(2) does it. A link is followed, so that of a copied link what it points to is
-/// given, and a link to nothing makes it fail.
+/// given, and a link to nothing makes it fail. So does another's link, which is not followed.
 bool GiveToMobileUser(const std::string& path) {
   return SetItemOwner(path.c_str(), GetMobileUserUID(), GetMobileUserGID(),
                       /*recursive=*/false) == 0;

@@ -2,7 +2,8 @@
 //
 // Single directory entries by path: what stands there, making a link, taking an entry away. Paths
 // are C strings in the kernel's terms: relative to nothing in particular, links in all but the last
-// component followed. Any thread; no lock.
+// component followed, but where entries are made or taken away only those of root and of this
+// process's user. Any thread; no lock.
 #pragma once
 
 #include <sys/types.h>

@@ -23,10 +23,12 @@ using FileError = std::optional<std::int32_t>;
 /// What a file manager keeps open for a place.
 struct OpenFolders;
 
-/// Where an item stands. Symbolic links in `path` are followed up to its last component. `subpath`,
-/// relative to the directory `path`, is never led anywhere else by a link above its last component:
-/// such an item cannot be reached (ELOOP). An empty `path` is the path that could not be decoded:
-/// nothing exists there, and every operation on it fails without an error object.
+/// Where an item stands. Symbolic links in `path` are followed up to its last component, and by
+/// what follows them at the end, only if they belong to root or to this process's user (EACCES):
+/// nobody else leads the process anywhere. `subpath`, relative to the directory `path`, is never
+/// led anywhere else by a link above its last component: such an item cannot be reached (ELOOP). An
+/// empty `path` is the path that could not be decoded: nothing exists there, and every operation on
+/// it fails without an error object.
 ///
 /// A place that is used for one item of a directory after another, by giving it another `subpath`,
 /// is reached faster than a new one: it remembers, shared with its copies, which folders are open.
@@ -58,7 +60,8 @@ class FileManager {
  public:
   virtual ~FileManager() = default;
 
-  /// What exists there, a link at the end followed: a link to nothing is absent.
+  /// What exists there, a link at the end followed: a link to nothing is absent, and a link that is
+  /// not followed is kOther.
   [[nodiscard]] virtual FileKind kind(const FilePlace& place) = 0;
 
   /// The mode as stat(2) gives it, type bits included, links followed; none when stat fails.
@@ -66,7 +69,7 @@ class FileManager {
 
   /// Everything below the directory, relative to it, a directory before what it holds. Links are
   /// listed, not entered; what cannot be read is listed without what is in it, and so are the
-  /// directories 200 levels below.
+  /// directories 200 levels below. A listing ends after 64 MiB of paths.
   [[nodiscard]] virtual std::vector<std::string> subpaths(const std::string& path) = 0;
 
   /// Makes a directory with exactly these attributes, whatever the process's umask. With

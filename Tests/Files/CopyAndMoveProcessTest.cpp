@@ -66,6 +66,33 @@ TEST_F(CopyFile, ThatIsALinkToWhatIsOnlyBesideItsSourceStaysButFailsWithoutALine
       << outcome.errors;
 }
 
+TEST_F(CopyFile, ReplacesALinkThatTheMobileUserPlantedAndGivesNothingBehindItAway) {
+  const Outcome outcome =
+      run(kHome +
+          "mkdir -p /tmp/s /tmp/guarded 'Library/Carrier Bundles'; echo text >/tmp/s/f\n"
+          "cd 'Library/Carrier Bundles'; ln -s /tmp/guarded f; chown -h mobile f\n"
+          "halvecctl call CopyFile /tmp/s \"$PWD\" f >/dev/null; echo $?\n"
+          "stat -c '%F %U' f /tmp/guarded; ls -A /tmp/guarded");
+  EXPECT_EQ(outcome.output, "0\nregular file mobile\ndirectory root\n") << outcome.errors;
+}
+
+TEST_F(CopyFile, GoesThroughNoLinkOfTheMobileUserOnTheWay) {
+  const Outcome outcome =
+      run(kHome +
+          "mkdir -p /tmp/s /tmp/guarded; echo text >/tmp/s/f; cd Library\n"
+          "ln -s /tmp/guarded 'Carrier Bundles'; chown -h mobile 'Carrier Bundles'\n"
+          "halvecctl call CopyFile /tmp/s \"$PWD/Carrier Bundles\" f >/dev/null 2>&1; echo $?\n"
+          "halvecctl call RemoveCarrierBundleLink \"$PWD/Carrier Bundles/f\" ''\n"
+          "ls -A /tmp/guarded; stat -c %U /tmp/guarded" +
+          kLog + " | tail -n 1");
+  EXPECT_EQ(outcome.output,
+            "1\ncode 5 (KERN_FAILURE)\nroot\n" +
+                Line(3,
+                     "Failed to copy the file /tmp/s to /var/mobile/Library/Carrier "
+                     "Bundles"))
+      << outcome.errors;
+}
+
 TEST_F(CopyFile, LeavesNothingOfAKillWhenTheNextCopyIsDone) {
   const Outcome outcome =
       run(kHome +
@@ -123,6 +150,16 @@ TEST_F(MoveCarrierBundles, ToAPackageBelowTmpMakesTheWholeTreeRoots) {
           "halvecctl call MoveCarrierBundles /tmp/b /tmp x.tcbk >/dev/null; echo $?\n"
           "ls -d /tmp/b 2>/dev/null; stat -c '%n %U' /tmp/x.tcbk /tmp/x.tcbk/sub/a");
   EXPECT_EQ(outcome.output, "0\n/tmp/x.tcbk root\n/tmp/x.tcbk/sub/a root\n") << outcome.errors;
+}
+
+TEST_F(MoveCarrierBundles, ThatAreALinkOfTheMobileUserMovesTheLinkAndGivesNothingAway) {
+  const Outcome outcome =
+      run("mkdir -p /tmp/guarded/sub; chown -R daemon /tmp/guarded\n"
+          "ln -s guarded /tmp/b; chown -h mobile /tmp/b\n"
+          "halvecctl call MoveCarrierBundles /tmp/b /tmp x.tcbk >/dev/null; echo $?\n"
+          "stat -c '%F %U' /tmp/x.tcbk /tmp/guarded /tmp/guarded/sub");
+  EXPECT_EQ(outcome.output, "0\nsymbolic link root\ndirectory daemon\ndirectory daemon\n")
+      << outcome.errors;
 }
 
 TEST_F(MoveCarrierBundles, ThatAreRefusedLeaveANewEmptyDirectory) {

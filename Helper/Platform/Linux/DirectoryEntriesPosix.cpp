@@ -1,15 +1,28 @@
 // SPDX-License-Identifier: Apache-2.0
 //
-// Directory entries through lstat(2), symlink(2) and remove(3). Any thread; no state.
+// Directory entries through lstat(2), symlinkat(2) and unlinkat(2), below the folder that the path
+// leads to (PathWalk.h). Any thread; no state.
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <cstdio>
+#include <cerrno>
+#include <string>
+#include <string_view>
 
 #include "Helper/Platform/DirectoryEntries.h"
+#include "Helper/Platform/Linux/FileLocation.h"
 
 namespace platform {
 namespace {
+
+/// Finds the folder of an entry, and its name with the slash that the path may have at its end: the
+/// kernel then takes it for a directory's.
+bool LocateEntry(std::string_view path, FileLocation& at) {
+  if (Locate(std::string(path), at) != 0) return false;
+  if (path.ends_with('/')) at.name += '/';
+  return true;
+}
 
 class PosixDirectoryEntries final : public DirectoryEntries {
  public:
@@ -19,9 +32,15 @@ class PosixDirectoryEntries final : public DirectoryEntries {
     return status.st_mode;
   }
   bool makeLink(const char* target, const char* path) override {
-    return ::symlink(target, path) == 0;
+    FileLocation at;
+    return LocateEntry(path, at) && ::symlinkat(target, at.folder(), at.name.c_str()) == 0;
   }
-  bool remove(const char* path) override { return std::remove(path) == 0; }
+  bool remove(const char* path) override {
+    FileLocation at;
+    if (!LocateEntry(path, at)) return false;
+    return ::unlinkat(at.folder(), at.name.c_str(), 0) == 0 ||
+           (errno == EISDIR && ::unlinkat(at.folder(), at.name.c_str(), AT_REMOVEDIR) == 0);
+  }
 };
 
 }  // namespace

@@ -14,6 +14,8 @@
 #include <string_view>
 #include <utility>
 
+#include "Helper/Platform/Linux/PathWalk.h"
+
 namespace platform {
 namespace {
 
@@ -72,7 +74,7 @@ SharedFolder Share(FileDescriptor folder) {
   return folder ? std::make_shared<const FileDescriptor>(std::move(folder)) : nullptr;
 }
 
-/// Finds the folder of a path, links followed.
+/// Finds the folder of a path.
 int LocatePath(std::string_view path, FileLocation& location) {
   while (path.ends_with('/')) path.remove_suffix(1);
   const std::size_t slash = path.rfind('/');
@@ -80,7 +82,7 @@ int LocatePath(std::string_view path, FileLocation& location) {
                                                            : path.substr(0, slash + 1));
   location.name = slash == std::string_view::npos ? path : path.substr(slash + 1);
   if (location.name.empty()) location.name = ".";
-  location.holder = Share(FileDescriptor(::open(folder.c_str(), kPathOnly)));
+  location.holder = Share(OpenDirectoryAt(AT_FDCWD, folder));
   return location.holder ? 0 : errno;
 }
 
@@ -90,7 +92,7 @@ int LocateBelow(const FilePlace& place, OpenFolders& opened, FileLocation& locat
   const std::size_t length = slash == std::string::npos ? 0 : slash;
   location.name.assign(place.subpath, slash == std::string::npos ? 0 : slash + 1);
   if (!opened.folder || place.subpath.compare(0, length, opened.path) != 0) {
-    if (!opened.root) opened.root = Share(FileDescriptor(::open(place.path.c_str(), kPathOnly)));
+    if (!opened.root) opened.root = Share(OpenDirectoryAt(AT_FDCWD, place.path));
     if (!opened.root) return errno;
     opened.path.assign(place.subpath, 0, length);
     opened.folder =

@@ -14,11 +14,15 @@
 
 #include "Helper/Platform/FileManager.h"
 #include "Helper/Platform/Linux/FileLocation.h"
+#include "Helper/Platform/Linux/PathWalk.h"
 #include "Helper/Platform/Linux/TreeCopy.h"
 #include "Helper/Platform/UserDatabase.h"
 
 namespace platform {
 namespace {
+
+/// Bytes of paths in one listing: of a hundred thousand items with long ones.
+constexpr std::size_t kMostListed = std::size_t{64} << 20;
 
 /// Turns a code into the answer of an operation.
 bool Answer(int code, FileError* error) {
@@ -83,19 +87,23 @@ int MakeFolder(int folder, const char* name, const Ids& ids,
 /// Opens the directory that a text of components leads to, making what is missing.
 int MakeFolders(FileDescriptor& at, std::string_view components, bool followLinks, const Ids& ids,
                 std::optional<std::uint32_t> permissions) {
-  const int flags = O_PATH | O_DIRECTORY | O_CLOEXEC | (followLinks ? 0 : O_NOFOLLOW);
+  const auto open = [&](const std::string& name) {
+    if (followLinks) return OpenDirectoryAt(at.get(), name);
+    return FileDescriptor(
+        ::openat(at.get(), name.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC | O_NOFOLLOW));
+  };
   while (true) {
     const std::size_t start = components.find_first_not_of('/');
     if (start == std::string_view::npos) return 0;
     components.remove_prefix(start);
     const std::string name(components.substr(0, components.find('/')));
     components.remove_prefix(name.size());
-    FileDescriptor next(::openat(at.get(), name.c_str(), flags));
+    FileDescriptor next = open(name);
     if (!next && errno == ENOENT) {
       const int error = MakeFolder(at.get(), name.c_str(), ids, permissions);
       // Another process may have made it first.
       if (error != 0 && error != EEXIST) return error;
-      next.reset(::openat(at.get(), name.c_str(), flags));
+      next = open(name);
       // A link to nothing can neither be entered nor made.
       if (!next && errno == ENOENT) return EEXIST;
     }
@@ -104,32 +112,32 @@ int MakeFolders(FileDescriptor& at, std::string_view components, bool followLink
   }
 }
 
-void ListBelow(FolderReader& reader, const std::string& prefix, int level,
+/// Lists as long as there is room for so many bytes of paths.
+void ListBelow(FolderReader& reader, const std::string& prefix, int level, std::size_t& room,
                std::vector<std::string>& names) {
   while (const dirent* entry = reader.next()) {
-    names.push_back(prefix + entry->d_name);
+    std::string name = prefix + entry->d_name;
+    if (name.size() > room) return;
+    room -= name.size();
+    names.push_back(std::move(name));
     if ((entry->d_type != DT_DIR && entry->d_type != DT_UNKNOWN) || level >= kDeepestLevel) {
       continue;
     }
     FolderReader below(OpenFolder(reader.descriptor(), entry->d_name));
-    if (below) ListBelow(below, std::string(names.back()) + '/', level + 1, names);
+    if (below) ListBelow(below, std::string(names.back()) + '/', level + 1, room, names);
   }
 }
 
 class FileManagerPosix final : public FileManager {
  public:
   FileKind kind(const FilePlace& place) override {
+    FileLocation at;
+    if (Locate(place, at) != 0) return FileKind::kAbsent;
+    FileDescriptor item = OpenPathAt(at.folder(), at.name, LastLink::kFollow);
+    // A link that is not followed is itself what stands there.
+    if (!item && errno == EACCES) item = OpenPathAt(at.folder(), at.name, LastLink::kOpen);
     struct stat status {};
-    if (place.subpath.empty()) {
-      // As every operation takes it: a slash at the end does not demand a directory.
-      const std::string path = place.path.substr(0, place.path.find_last_not_of('/') + 1);
-      const bool isRoot = path.empty() && !place.path.empty();
-      if (::stat(isRoot ? "/" : path.c_str(), &status) != 0) return FileKind::kAbsent;
-    } else {
-      FileLocation at;
-      if (Locate(place, at) != 0) return FileKind::kAbsent;
-      if (::fstatat(at.folder(), at.name.c_str(), &status, 0) != 0) return FileKind::kAbsent;
-    }
+    if (!item || ::fstat(item.get(), &status) != 0) return FileKind::kAbsent;
     return S_ISDIR(status.st_mode) ? FileKind::kDirectory : FileKind::kOther;
   }
 
@@ -141,9 +149,11 @@ class FileManagerPosix final : public FileManager {
 
   std::vector<std::string> subpaths(const std::string& path) override {
     std::vector<std::string> names;
-    FolderReader reader(
-        FileDescriptor(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NONBLOCK | O_CLOEXEC)));
-    if (reader) ListBelow(reader, "", 0, names);
+    const FileDescriptor folder = OpenDirectoryAt(AT_FDCWD, path);
+    if (!folder) return names;
+    FolderReader reader(OpenFolder(folder.get(), "."));
+    std::size_t room = kMostListed;
+    if (reader) ListBelow(reader, "", 0, room, names);
     return names;
   }
 
@@ -197,7 +207,10 @@ class FileManagerPosix final : public FileManager {
     return Answer(code, error);
   }
 
-  bool removeEmptyDirectory(const std::string& path) override { return ::rmdir(path.c_str()) == 0; }
+  bool removeEmptyDirectory(const std::string& path) override {
+    FileLocation at;
+    return Locate(path, at) == 0 && ::unlinkat(at.folder(), at.name.c_str(), AT_REMOVEDIR) == 0;
+  }
 
   bool setAttributes(const FileAttributes& attributes, const FilePlace& place,
                      FileError* error) override {
@@ -210,7 +223,8 @@ class FileManagerPosix final : public FileManager {
   }
 
   bool changeOwner(const std::string& path, std::uint32_t uid, std::uint32_t gid) override {
-    return ::chown(path.c_str(), uid, gid) == 0;
+    const FileDescriptor item = OpenPathAt(AT_FDCWD, path, LastLink::kFollow);
+    return item && ::fchownat(item.get(), "", uid, gid, AT_EMPTY_PATH) == 0;
   }
 
  private:

@@ -13,6 +13,7 @@
 #include "Helper/Platform/Linux/ArchiveWriter.h"
 #include "Helper/Platform/Linux/FileBody.h"
 #include "Helper/Platform/Linux/OpenRegularFile.h"
+#include "Helper/Platform/Linux/PathWalk.h"
 #include "Helper/Platform/Linux/SideCarFolding.h"
 #include "Helper/Platform/Linux/ZipReader.h"
 
@@ -33,7 +34,7 @@ int OpenDestination(const std::string& path, FileDescriptor& folder) {
   if (!Shared<FileManager>().createDirectory(path, /*intermediates=*/true, attributes, &error)) {
     return error.value_or(EIO);
   }
-  folder.reset(::open(path.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
+  folder = OpenDirectoryAt(AT_FDCWD, path);
   return folder ? 0 : errno;
 }
 
