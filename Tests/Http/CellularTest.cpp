@@ -2,10 +2,16 @@
 //
 // Transfers that may not use cellular, between a Wi-Fi and a cellular link in a network namespace
 // of the test's own. What counts is what the kernel counts: packets sent on the cellular interface.
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <linux/if_tun.h>
+#include <net/if.h>
+#include <netinet/in.h>
 #include <sched.h>
 #include <stdlib.h>
+#include <sys/ioctl.h>
 #include <sys/mount.h>
+#include <sys/socket.h>
 #include <unistd.h>
 
 #include <filesystem>
@@ -28,6 +34,44 @@ using Response = std::shared_ptr<vlu::Http::HttpResponse>;
 /// Runs `command` of ip(8).
 void Ip(const std::string& command) {
   EXPECT_EQ(std::system(("ip " + command).c_str()), 0) << command;  // NOLINT(concurrency-mt-unsafe)
+}
+
+/// What the kernel says of its network devices in /sys, for this process. Needs root.
+class DeviceTypes {
+ public:
+  DeviceTypes() {
+    EXPECT_EQ(::unshare(CLONE_NEWNS), 0);
+    EXPECT_EQ(::mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr), 0);
+    EXPECT_EQ(::mount("none", interfaces_.c_str(), "tmpfs", 0, nullptr), 0);
+  }
+  ~DeviceTypes() { EXPECT_EQ(::umount2(interfaces_.c_str(), MNT_DETACH), 0); }
+  DeviceTypes(const DeviceTypes&) = delete;
+  DeviceTypes& operator=(const DeviceTypes&) = delete;
+
+  void set(const std::string& name, const std::string& uevent) {
+    std::filesystem::create_directory(interfaces_ + "/" + name);
+    std::ofstream(interfaces_ + "/" + name + "/uevent") << uevent;
+  }
+
+ private:
+  const std::string interfaces_ = "/sys/class/net";
+};
+
+/// Makes a tunnel's device run, by holding its other end as a daemon does; empty for other devices.
+platform::FileDescriptor HoldTunnel(const std::string& name) {
+  for (const int mode : {IFF_TUN, IFF_TAP}) {
+    platform::FileDescriptor device(::open("/dev/net/tun", O_RDWR | O_CLOEXEC));
+    ifreq request{};
+    name.copy(request.ifr_name, sizeof request.ifr_name - 1);
+    request.ifr_flags = static_cast<short>(mode | IFF_NO_PI);
+    if (device && ::ioctl(device.get(), TUNSETIFF, &request) == 0) return device;
+  }
+  return {};
+}
+
+/// Keeps an interface from saying something by itself.
+void Silence(const std::string& name) {
+  std::ofstream("/proc/sys/net/ipv6/conf/" + name + "/disable_ipv6") << "1";
 }
 
 class OffCellular : public ::testing::Test {
@@ -151,6 +195,25 @@ TEST_F(OffCellular, AServerOnLoopbackIsNotTrustedToStayOffCellular) {
   EXPECT_EQ(sent("pdp_ip0"), 0);
 }
 
+TEST_F(OffCellular, AServerOfTheHandsetsOwnIsNotTrustedUnderAnyAddress) {
+  const platform::FileDescriptor server(::socket(AF_INET6, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  sockaddr_in6 everywhere{};
+  everywhere.sin6_family = AF_INET6;
+  everywhere.sin6_port = htons(53);
+  ASSERT_EQ(::bind(server.get(), reinterpret_cast<const sockaddr*>(&everywhere), sizeof everywhere),
+            0);
+  for (const char* address :
+       {"10.20.0.2", "fd00:20::2", "0.0.0.0", "::", "::ffff:127.0.0.1", "::ffff:10.20.0.2"}) {
+    setServers(std::string("nameserver ") + address + "\n");
+    EXPECT_EQ(outcome("http://web.example/hello"), "no network that may be used") << address;
+    char byte = 0;
+    EXPECT_LT(::recv(server.get(), &byte, 1, MSG_DONTWAIT), 0) << "asked at " << address;
+  }
+  std::ofstream(folder + "/resolv-too.conf") << "nameserver 10.20.0.1\n";
+  EXPECT_EQ(outcome("http://web.example/hello"), "hello") << "of the next file";
+  EXPECT_EQ(sent("pdp_ip0"), 0);
+}
+
 TEST_F(OffCellular, NothingIsSentWhenThereIsNoWifi) {
   Ip("link set wlan0 down");
   const long before = sent("wlan0");
@@ -189,14 +252,40 @@ TEST_F(OffCellular, EveryNameOfACellularInterfaceCounts) {
   EXPECT_EQ(outcome("http://198.51.100.10/hello"), "hello") << "another name is none of these";
 }
 
-TEST_F(OffCellular, ATunnelIsNotTaken) {
+TEST_F(OffCellular, ATunnelOrABridgeIsNotTakenWhateverItFrames) {
   Ip("link set wlan0 down");
-  Ip("tuntap add dev tun0 mode tun");
-  Ip("address add 10.99.0.2/24 dev tun0");
-  Ip("link set tun0 up");
-  Ip("route add 198.51.100.10/32 dev tun0");
+  for (const char* command :
+       {"tuntap add dev soft0 mode tun", "tuntap add dev soft0 mode tap",
+        "link add soft0 type vxlan id 5 dstport 4789 remote 10.65.0.1 dev pdp_ip0",
+        "link add soft0 type bridge mcast_snooping 0"}) {
+    Ip(command);
+    // A device that somebody holds open runs; so does a bridge with a running port.
+    const platform::FileDescriptor held = HoldTunnel("soft0");
+    Silence("soft0");
+    Ip("address add 10.99.0.2/24 dev soft0");
+    Ip("link set soft0 up");
+    if (std::string(command).find("bridge") != std::string::npos) {
+      Ip("link add port0 type veth peer name port1");
+      Silence("port1");
+      Ip("link set port1 up");
+      Ip("link set port0 up master soft0");
+    }
+    Ip("route add 198.51.100.10/32 dev soft0");
+    EXPECT_EQ(outcome("http://198.51.100.10/hello"), "no network that may be used") << command;
+    EXPECT_EQ(sent("soft0"), 0) << command;
+    Ip("link del soft0");
+  }
+  EXPECT_EQ(sent("pdp_ip0"), 0);
+}
+
+TEST_F(OffCellular, ATunnelThatOnlyItsDeviceTypeTellsIsNotTaken) {
+  DeviceTypes types;
+  types.set("wlan0", "DEVTYPE=wlan\nINTERFACE=wlan0\n");
+  EXPECT_EQ(outcome("http://198.51.100.10/hello"), "hello");
+  types.set("wlan0", "DEVTYPE=l2tpeth\nINTERFACE=wlan0\n");
   EXPECT_EQ(outcome("http://198.51.100.10/hello"), "no network that may be used");
-  EXPECT_EQ(sent("tun0"), 0);
+  types.set("wlan0", "DEVTYPE=wwan\nINTERFACE=wlan0\n");
+  EXPECT_EQ(outcome("http://198.51.100.10/hello"), "no network that may be used");
 }
 
 TEST_F(OffCellular, LoopbackIsForLoopbackAddressesAlone) {
@@ -230,18 +319,10 @@ TEST(CellularInterface, IsToldByItsName) {
 }
 
 TEST(CellularInterface, IsToldByItsDeviceType) {
-  if (::geteuid() != 0 || ::unshare(CLONE_NEWNS) != 0) {
-    GTEST_SKIP() << "a mount namespace of one's own needs root";
-  }
-  const std::string interfaces = "/sys/class/net";
-  ASSERT_EQ(::mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr), 0);
-  ASSERT_EQ(::mount("none", interfaces.c_str(), "tmpfs", 0, nullptr), 0);
-  const auto make = [&](const std::string& name, const std::string& uevent) {
-    std::filesystem::create_directory(interfaces + "/" + name);
-    std::ofstream(interfaces + "/" + name + "/uevent") << uevent;
-  };
-  make("usb0", "DEVTYPE=wwan\nINTERFACE=usb0\nIFINDEX=7\n");
-  make("wlan0", "DEVTYPE=wlan\nINTERFACE=wlan0\nIFINDEX=8\n");
+  if (::geteuid() != 0) GTEST_SKIP() << "a mount namespace of one's own needs root";
+  DeviceTypes types;
+  types.set("usb0", "DEVTYPE=wwan\nINTERFACE=usb0\nIFINDEX=7\n");
+  types.set("wlan0", "DEVTYPE=wlan\nINTERFACE=wlan0\nIFINDEX=8\n");
   EXPECT_TRUE(platform::IsCellularInterface("usb0"));
   EXPECT_FALSE(platform::IsCellularInterface("wlan0"));
   EXPECT_FALSE(platform::IsCellularInterface("absent0"));

@@ -103,7 +103,9 @@ std::vector<SocketAddress> Servers(const ResolverProfile& profile) {
     ForEachLine(file, "#;", [&](const std::vector<std::string>& words) {
       if (words[0] != "nameserver" || servers.size() == kMostServers) return;
       const auto address = ParseAddress(words[1], profile.port);
-      if (address && !IsLoopback(address->get())) servers.push_back(*address);
+      if (address && !IsLoopback(address->get()) && EligibleInterface(address->get())) {
+        servers.push_back(*address);
+      }
     });
     if (!servers.empty()) break;
   }
@@ -247,8 +249,7 @@ std::optional<std::vector<std::string>> ResolveWithoutCellular(const std::string
   if (ParseAddress(host, 0)) return Addresses{host};
   if (auto known = AddressesInHosts(profile.hostsFile, host); !known.empty()) return known;
   if (EncodeDnsQuery(0, host, DnsType::kA).empty()) return Addresses{};
-  auto servers = Servers(profile);
-  std::erase_if(servers, [](const auto& each) { return !EligibleInterface(each.get()); });
+  const auto servers = Servers(profile);
   if (servers.empty()) return std::nullopt;
   for (int round = 0; round < kRounds; ++round) {
     for (const SocketAddress& server : servers) {

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // Name resolution that never uses cellular: the system's own resolver asks over any network, and a
-// local one on the loopback interface passes the question on to any. Any thread; no state.
+// local one passes the question on to any. Any thread; no state.
 #pragma once
 
 #include <chrono>
@@ -16,7 +16,8 @@ namespace platform {
 
 struct ResolverProfile {
   std::string hostsFile = "/etc/hosts";
-  /// The first file that names a server which is not on the loopback interface counts.
+  /// The first file that names a server beyond the handset which can be reached without cellular
+  /// counts.
   std::vector<std::string> serverFiles{"/etc/resolv.conf", "/run/systemd/resolve/resolv.conf",
                                        "/run/NetworkManager/no-stub-resolv.conf"};
   std::uint16_t port = 53;

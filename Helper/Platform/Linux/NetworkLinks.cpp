@@ -30,8 +30,16 @@ namespace {
 constexpr std::array kCellularNames{"pdp_ip*", "rmnet*", "wwan*", "ccmni*", "ppp*"};
 constexpr std::size_t kLongestUevent = 4096;
 
+bool HasDeviceType(const std::string& name, const std::string& type) {
+  const auto uevent =
+      ReadRegularFile(("/sys/class/net/" + name + "/uevent").c_str(), kLongestUevent);
+  if (!uevent) return false;
+  const std::string_view text(reinterpret_cast<const char*>(uevent->data()), uevent->size());
+  return text.find("DEVTYPE=" + type + "\n") != std::string_view::npos;
+}
+
 struct Address {
-  std::span<const std::byte> bytes;  // in the caller's structure
+  std::span<const std::byte> bytes;  // in the caller's structure; empty where no link leads there
   bool loopback = false;
   int scope = 0;  // the interface that a link-local address names, else 0
 };
@@ -40,10 +48,15 @@ Address AddressOf(const sockaddr& destination) {
   if (destination.sa_family == AF_INET) {
     const auto& address = reinterpret_cast<const sockaddr_in&>(destination).sin_addr;
     const bool loopback = (ntohl(address.s_addr) >> 24) == IN_LOOPBACKNET;
+    if (address.s_addr == htonl(INADDR_ANY)) return {};  // it stands for the handset itself
     return {std::as_bytes(std::span(&address, 1)), loopback, 0};
   }
   if (destination.sa_family == AF_INET6) {
     const auto& whole = reinterpret_cast<const sockaddr_in6&>(destination);
+    // The same, and what the kernel sends by the routes of IPv4, which were not asked.
+    if (IN6_IS_ADDR_UNSPECIFIED(&whole.sin6_addr) || IN6_IS_ADDR_V4MAPPED(&whole.sin6_addr)) {
+      return {};
+    }
     return {std::as_bytes(std::span(&whole.sin6_addr, 1)),
             IN6_IS_ADDR_LOOPBACK(&whole.sin6_addr) != 0, static_cast<int>(whole.sin6_scope_id)};
   }
@@ -75,33 +88,58 @@ struct Fitness {
   }
 };
 
-std::optional<Fitness> FitnessOf(std::span<const std::byte> reply) {
+/// A reply of the kernel: what its message begins with, and the attributes behind that.
+template <class Body>
+struct Reply {
+  Body body;
+  std::span<const std::byte> attributes;
+};
+
+/// Takes a whole message of type `type` apart; none where `bytes` is anything else.
+template <class Body>
+std::optional<Reply<Body>> ReplyIn(std::span<const std::byte> bytes, std::uint16_t type) {
   nlmsghdr header;
-  rtmsg route;
-  if (reply.size() < sizeof header + sizeof route) return std::nullopt;
-  std::memcpy(&header, reply.data(), sizeof header);
-  if (header.nlmsg_type != RTM_NEWROUTE || header.nlmsg_len > reply.size()) return std::nullopt;
-  std::memcpy(&route, reply.data() + sizeof header, sizeof route);
-  if (route.rtm_type != RTN_UNICAST && route.rtm_type != RTN_LOCAL) return std::nullopt;
-  Fitness fitness{route.rtm_dst_len, 0};
-  auto rest =
-      reply.subspan(sizeof header + sizeof route, header.nlmsg_len - sizeof header - sizeof route);
-  rtattr head;
-  while (rest.size() >= sizeof head) {
-    std::memcpy(&head, rest.data(), sizeof head);
-    if (head.rta_len < sizeof head || head.rta_len > rest.size()) break;
-    if (head.rta_type == RTA_PRIORITY && head.rta_len == sizeof head + sizeof fitness.metric) {
-      std::memcpy(&fitness.metric, rest.data() + sizeof head, sizeof fitness.metric);
-    }
-    rest = rest.subspan(std::min(rest.size(), std::size_t{RTA_ALIGN(head.rta_len)}));
+  Reply<Body> reply;
+  constexpr std::size_t kHead = sizeof header + sizeof reply.body;
+  if (bytes.size() < kHead) return std::nullopt;
+  std::memcpy(&header, bytes.data(), sizeof header);
+  if (header.nlmsg_type != type || header.nlmsg_len < kHead || header.nlmsg_len > bytes.size()) {
+    return std::nullopt;
   }
-  return fitness;
+  std::memcpy(&reply.body, bytes.data() + sizeof header, sizeof reply.body);
+  reply.attributes = bytes.first(header.nlmsg_len).subspan(kHead);
+  return reply;
+}
+
+/// The value of the first attribute of that type; empty without one.
+std::span<const std::byte> AttributeIn(std::span<const std::byte> attributes, int type) {
+  rtattr head;
+  while (attributes.size() >= sizeof head) {
+    std::memcpy(&head, attributes.data(), sizeof head);
+    if (head.rta_len < sizeof head || head.rta_len > attributes.size()) break;
+    if ((head.rta_type & NLA_TYPE_MASK) == type) {
+      return attributes.first(head.rta_len).subspan(sizeof head);
+    }
+    attributes =
+        attributes.subspan(std::min(attributes.size(), std::size_t{RTA_ALIGN(head.rta_len)}));
+  }
+  return {};
+}
+
+using ReplyBuffer = std::array<std::byte, std::size_t{16} << 10>;
+
+/// The kernel's answer to the message that `query` begins with, in `buffer`; empty without one.
+template <class Query>
+std::span<const std::byte> AskKernel(const Query& query, ReplyBuffer& buffer) {
+  const FileDescriptor netlink(::socket(AF_NETLINK, SOCK_RAW | SOCK_CLOEXEC, NETLINK_ROUTE));
+  if (!netlink || ::send(netlink.get(), &query, query.header.nlmsg_len, 0) < 0) return {};
+  // The kernel has answered by the time that send returns.
+  const ssize_t length = ::recv(netlink.get(), buffer.data(), buffer.size(), MSG_DONTWAIT);
+  return std::span(buffer).first(length < 0 ? 0 : static_cast<std::size_t>(length));
 }
 
 /// The route to `address` through the interface of that index; none when there is none.
 std::optional<Fitness> RouteThrough(int index, sa_family_t family, const Address& address) {
-  const FileDescriptor netlink(::socket(AF_NETLINK, SOCK_RAW | SOCK_CLOEXEC, NETLINK_ROUTE));
-  if (!netlink) return std::nullopt;
   RouteQuery query;
   query.header.nlmsg_len = offsetof(RouteQuery, attributes);
   query.header.nlmsg_type = RTM_GETROUTE;
@@ -113,21 +151,55 @@ std::optional<Fitness> RouteThrough(int index, sa_family_t family, const Address
   query.route.rtm_flags = RTM_F_FIB_MATCH;
   AppendAttribute(query, RTA_OIF, std::as_bytes(std::span(&index, 1)));
   AppendAttribute(query, RTA_DST, address.bytes);
-  std::array<std::byte, 4096> reply;
-  if (::send(netlink.get(), &query, query.header.nlmsg_len, 0) < 0) return std::nullopt;
-  // The kernel has answered by the time that send returns.
-  const ssize_t length = ::recv(netlink.get(), reply.data(), reply.size(), MSG_DONTWAIT);
-  if (length < 0) return std::nullopt;
-  return FitnessOf(std::span(reply).first(static_cast<std::size_t>(length)));
+  ReplyBuffer buffer;
+  const auto reply = ReplyIn<rtmsg>(AskKernel(query, buffer), RTM_NEWROUTE);
+  // What is the handset's own address never leaves it, whatever link the address belongs to.
+  if (!reply || reply->body.rtm_type != (address.loopback ? RTN_LOCAL : RTN_UNICAST)) {
+    return std::nullopt;
+  }
+  Fitness fitness{reply->body.rtm_dst_len, 0};
+  const auto metric = AttributeIn(reply->attributes, RTA_PRIORITY);
+  if (metric.size() == sizeof fitness.metric) {
+    std::memcpy(&fitness.metric, metric.data(), sizeof fitness.metric);
+  }
+  return fitness;
+}
+
+struct LinkQuery {
+  nlmsghdr header{};
+  ifinfomsg link{};
+};
+
+/// What the kernel calls the kind of a device that it makes in software ("tun", "vxlan", "veth");
+/// empty for every other device, none when it does not tell.
+std::optional<std::string> SoftwareKindOf(int index) {
+  LinkQuery query;
+  query.header = {sizeof query, RTM_GETLINK, NLM_F_REQUEST, 0, 0};
+  query.link.ifi_index = index;
+  ReplyBuffer buffer;
+  const auto reply = ReplyIn<ifinfomsg>(AskKernel(query, buffer), RTM_NEWLINK);
+  if (!reply) return std::nullopt;
+  const auto kind = AttributeIn(AttributeIn(reply->attributes, IFLA_LINKINFO), IFLA_INFO_KIND);
+  const std::string text(reinterpret_cast<const char*>(kind.data()), kind.size());
+  return text.substr(0, text.find('\0'));
+}
+
+/// Whether frames leave the handset where this interface is, as far as the kernel knows: not a
+/// tunnel, nor a bridge or the like over others. A veth is a cable, to another name space.
+bool HasItsOwnWire(int index, const std::string& name) {
+  const auto kind = SoftwareKindOf(index);
+  if (!kind || (!kind->empty() && *kind != "veth")) return false;
+  return !HasDeviceType(name, "l2tpeth");  // the one tunnel that has no kind
 }
 
 bool IsEligible(const ifaddrs& interface, bool loopback) {
   constexpr unsigned int kUp = IFF_UP | IFF_RUNNING;
   if (!interface.ifa_addr || interface.ifa_addr->sa_family != AF_PACKET) return false;
   if ((interface.ifa_flags & kUp) != kUp) return false;
-  const auto kind = reinterpret_cast<const sockaddr_ll*>(interface.ifa_addr)->sll_hatype;
-  if (loopback) return kind == ARPHRD_LOOPBACK;
-  return kind == ARPHRD_ETHER && !IsCellularInterface(interface.ifa_name);
+  const auto& link = *reinterpret_cast<const sockaddr_ll*>(interface.ifa_addr);
+  if (loopback) return link.sll_hatype == ARPHRD_LOOPBACK;
+  return link.sll_hatype == ARPHRD_ETHER && !IsCellularInterface(interface.ifa_name) &&
+         HasItsOwnWire(link.sll_ifindex, interface.ifa_name);
 }
 
 }  // namespace
@@ -137,11 +209,7 @@ bool IsCellularInterface(const std::string& name) {
                   [&](const char* pattern) { return ::fnmatch(pattern, name.c_str(), 0) == 0; })) {
     return true;
   }
-  const auto uevent =
-      ReadRegularFile(("/sys/class/net/" + name + "/uevent").c_str(), kLongestUevent);
-  if (!uevent) return false;
-  const std::string_view text(reinterpret_cast<const char*>(uevent->data()), uevent->size());
-  return text.find("DEVTYPE=wwan\n") != std::string_view::npos;
+  return HasDeviceType(name, "wwan");
 }
 
 std::optional<int> EligibleInterface(const sockaddr& destination) {

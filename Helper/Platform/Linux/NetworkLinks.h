@@ -19,9 +19,10 @@ namespace platform {
 
 /// The index of the interface for traffic to `destination` that must not use cellular: of the
 /// eligible interfaces the one that the kernel's own rules prefer, longest prefix before lowest
-/// metric. Eligible is what is up, frames Ethernet as Wi-Fi does (tunnels do not: what carries them
-/// is unknown), is not cellular and has a route there; for a loopback address the loopback
-/// interface and nothing else. None when there is no such interface.
+/// metric. Eligible is what is up, frames Ethernet as Wi-Fi does, is neither a tunnel nor made of
+/// other interfaces (what carries those is unknown), is not cellular and has a route there; for a
+/// loopback address the loopback interface and nothing else. None when there is no such interface,
+/// and for the handset's own addresses and those that IPv6 maps from IPv4.
 [[nodiscard]] std::optional<int> EligibleInterface(const sockaddr& destination);
 
 /// A new socket that can reach the network through the interface of EligibleInterface() alone
