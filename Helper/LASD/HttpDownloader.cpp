@@ -1,12 +1,19 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Helper/LASD/HttpDownloader.h"
 
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <ext/stdio_filebuf.h>
+
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <fstream>
 #include <semaphore>
+#include <utility>
 
+#include "Helper/Platform/FileDescriptor.h"
 #include "Helper/Platform/SystemLog.h"
 #include "Helper/Platform/vlu/Compression.h"
 
@@ -22,6 +29,27 @@ constexpr const char* kGzip = "gzip";
 const char* ErrorText(int error) {
   const char* text = ::strerrordesc_np(error);
   return text ? text : "Unknown error";
+}
+
+/// Opens the file at `path` for writing, emptied, as "w" does for fopen(3); 0 or an error number.
+///
+/// Unlike there no link is followed (ELOOP), nobody is waited for at a FIFO (ENXIO, EOPNOTSUPP) and
+/// a file with a second name is left alone (EMLINK): the folder's owner may put any of those there
+/// at the last moment, to have this process write where he may not.
+int OpenForWriting(const std::string& path, std::ofstream& stream) {
+  constexpr int kFlags = O_WRONLY | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC;
+  constexpr mode_t kMode = 0666;  // less the umask
+  platform::FileDescriptor file(::open(path.c_str(), kFlags, kMode));
+  struct stat status {};
+  if (!file || ::fstat(file.get(), &status) != 0) return errno;
+  if (!S_ISREG(status.st_mode)) return EOPNOTSUPP;
+  if (status.st_nlink > 1) return EMLINK;
+  if (::ftruncate(file.get(), 0) != 0) return errno;
+  __gnu_cxx::stdio_filebuf<char> buffer(file.get(), std::ios::out | std::ios::binary);
+  if (!buffer.is_open()) return errno;
+  (void)file.release();  // the buffer's now
+  *stream.rdbuf() = std::move(buffer);
+  return 0;
 }
 
 }  // namespace
@@ -90,9 +118,9 @@ bool HttpDownloader::uncompressTo(const std::string& path) const {
         kContentType, contentType->second.c_str());
     return false;
   }
-  std::ofstream file(path, std::ios::out | std::ios::trunc | std::ios::binary);
-  if (!file.is_open()) {
-    Log(LogPriority::kNotice, "Cannot open output file %s: %s\n", path.c_str(), ErrorText(errno));
+  std::ofstream file;
+  if (const int error = OpenForWriting(path, file); error != 0) {
+    Log(LogPriority::kNotice, "Cannot open output file %s: %s\n", path.c_str(), ErrorText(error));
     return false;
   }
   if (vlu::Compression::Decompress(body_, file)) return true;

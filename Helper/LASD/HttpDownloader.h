@@ -25,10 +25,11 @@ class HttpDownloader {
   /// bounded there. May be called again.
   [[nodiscard]] bool fetch(const std::string& url, bool wifiOnly);
 
-  /// Writes the gunzipped body to the file at `path`, replacing what it held; follows a link there.
-  /// True when all of it was written. False, with a line in the log, when nothing was fetched, the
-  /// Content-Type field is absent or does not contain "gzip", or the file cannot be opened; and
-  /// when the body cannot be gunzipped into it, in which case nothing is left at `path`.
+  /// Writes the gunzipped body to the file at `path`, replacing what it held. True when all of it
+  /// was written. False, with a line in the log, when nothing was fetched, the Content-Type field
+  /// is absent or does not contain "gzip", or the file cannot be opened, which is so for a link,
+  /// for a file with a second name and for what is no regular file; and when the body cannot be
+  /// gunzipped into it, in which case nothing is left at `path`.
   [[nodiscard]] bool uncompressTo(const std::string& path) const;
 
   /// The body of the last successful fetch; empty otherwise.

@@ -43,19 +43,21 @@ std::optional<std::string> FileNameOf(const std::string& url) {
   return name.substr(0, name.find(".gz"));
 }
 
-/// Waits until the file or directory at `path` is on the disk.
-bool Synchronize(const std::string& path) {
-  const FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC));
+/// Waits until what stands at `path` is on the disk. `kind` tells what that may be: O_NOFOLLOW, no
+/// link; O_DIRECTORY, a directory. A FIFO is not waited for.
+bool Synchronize(const std::string& path, int kind) {
+  const FileDescriptor file(
+      ::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC | kind));
   return file && ::fsync(file.get()) == 0;
 }
 
 /// Gunzips what was downloaded to `path`, where nothing stands or a file of an earlier attempt.
 bool WriteDatabase(const HttpDownloader& downloader, const std::string& path) {
   Log(LogPriority::kNotice, "uncompressing to %s\n", path.c_str());
-  // A link left there would be followed, by a process that may write anywhere. What cannot be
-  // removed, a directory, cannot be opened for writing either.
+  // A link or a FIFO that stands there would not be opened, nor a file with a second name. What
+  // cannot be removed, a directory, cannot be opened for writing either.
   (void)::unlink(path.c_str());
-  if (downloader.uncompressTo(path) && Synchronize(path)) return true;
+  if (downloader.uncompressTo(path) && Synchronize(path, O_NOFOLLOW)) return true;
   Log(LogPriority::kNotice, "Failed to commit the data to file for %s\n", path.c_str());
   return false;
 }
@@ -117,7 +119,8 @@ bool LASDUpdater::installDatabase(const std::string& url, LASDDatabaseType type)
     return false;
   // The file's name, and that of a new directory, are on the disk before the record is: a power cut
   // may not leave a record without its file.
-  return Synchronize(directory_) && Synchronize(directory_ + "/..") && record(type);
+  return Synchronize(directory_, O_DIRECTORY) && Synchronize(directory_ + "/..", O_DIRECTORY) &&
+         record(type);
 }
 
 bool LASDUpdater::makeDirectory() const {

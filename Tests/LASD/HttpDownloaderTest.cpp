@@ -3,8 +3,11 @@
 // The downloader on a web in memory: its steps, and its lines byte for byte.
 #include "Helper/LASD/HttpDownloader.h"
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <pthread.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 #include <array>
 #include <cstdlib>
@@ -15,6 +18,7 @@
 #include <semaphore>
 #include <thread>
 
+#include "Helper/Platform/FileDescriptor.h"
 #include "Helper/Platform/SystemLog.h"
 #include "Tests/Fakes/FakeHttpTransport.h"
 #include "Tests/Fakes/FakeSystemLog.h"
@@ -304,14 +308,38 @@ TEST_F(HttpDownloads, LeaveNoFileOfCorruptData) {
   EXPECT_EQ(content(), "(none)");
 }
 
-TEST_F(HttpDownloads, RemoveALinkAndNotWhatItLeadsTo) {
+TEST_F(HttpDownloads, WriteThroughNoLinkAndNoSecondName) {
   const std::string target = folder + "/target";
   std::ofstream(target) << "something";
+  fetchBody(support::Gzip("the database"), {{"Content-Type", "application/gzip"}});
   std::filesystem::create_symlink(target, path);
-  fetchBody(BytesOf("no gzip at all"), {{"Content-Type", "application/gzip"}});
   EXPECT_FALSE(downloader.uncompressTo(path));
-  EXPECT_FALSE(std::filesystem::exists(std::filesystem::symlink_status(path)));
-  EXPECT_TRUE(std::filesystem::exists(target));
+  std::filesystem::remove(path);
+  std::filesystem::create_hard_link(target, path);
+  EXPECT_FALSE(downloader.uncompressTo(path));
+  EXPECT_EQ(content(), "something") << "under either name";
+  std::filesystem::remove(path);
+  std::filesystem::create_symlink(folder + "/absent", path);
+  EXPECT_FALSE(downloader.uncompressTo(path));
+  EXPECT_FALSE(std::filesystem::exists(folder + "/absent"));
+  const std::string line = "Cannot open output file " + path + ": ";
+  EXPECT_EQ(log.takeLines(), (Lines{Notice(line + "Too many levels of symbolic links\n"),
+                                    Notice(line + "Too many links\n"),
+                                    Notice(line + "Too many levels of symbolic links\n")}));
+}
+
+TEST_F(HttpDownloads, WaitForNobodyAtAFifo) {
+  fetchBody(support::Gzip("the database"), {{"Content-Type", "application/gzip"}});
+  ASSERT_EQ(::mkfifo(path.c_str(), 0600), 0);
+  EXPECT_FALSE(downloader.uncompressTo(path));
+  const platform::FileDescriptor reader(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+  ASSERT_TRUE(reader);
+  EXPECT_FALSE(downloader.uncompressTo(path));
+  char byte = 0;
+  EXPECT_EQ(::read(reader.get(), &byte, 1), 0) << "nothing is written there either";
+  const std::string line = "Cannot open output file " + path + ": ";
+  EXPECT_EQ(log.takeLines(), (Lines{Notice(line + "No such device or address\n"),
+                                    Notice(line + "Operation not supported\n")}));
 }
 
 TEST_F(HttpDownloads, SayWhyAPartialFileCannotBeRemoved) {
