@@ -3,6 +3,8 @@
 // Whole checks by the real helper against a real web server: files, records, notifications, and how
 // long the helper stays.
 #include <cstdlib>
+#include <filesystem>
+#include <fstream>
 #include <string>
 
 #include "Tests/LASD/WebSuite.h"
@@ -71,6 +73,20 @@ TEST_F(Checks, InstallAllFiveThenWhatChangedUpwardsAndDownwards) {
                 "},\"files\":{\"cdma.db\":7,\"gsm.db\":6,\"lte.db\":6,\"scdma.db\":8,\"umts.db\":6}"
                 "}\ncdma.db\ngsm.db\nlte.db\nscdma.db\numts.db\n")
       << outcome.errors;
+}
+
+TEST_F(Checks, WriteTheKeysOfTheirConnectionsNowhereWhateverTheEnvironmentSays) {
+  const handset_tests::TemporaryFolder folder;
+  const std::string starter = folder.path() + "/helper-with-environment";
+  std::ofstream(starter) << "#!/bin/sh\n"
+                            "export SSLKEYLOGFILE=/tmp/keys\n"
+                            "exec /usr/libexec/halvec/helper\n";
+  std::filesystem::permissions(starter, std::filesystem::perms::owner_all |
+                                            std::filesystem::perms::group_exec |
+                                            std::filesystem::perms::others_exec);
+  const Outcome outcome = check("offer 1 gsm; halvecctl lasd update; told 0 1; ls /tmp | grep keys",
+                                {"--helper", starter});
+  EXPECT_EQ(outcome.output, "UpdateAvailable gsm\n") << outcome.errors;
 }
 
 TEST_F(Checks, RunOneAfterTheOther) {
