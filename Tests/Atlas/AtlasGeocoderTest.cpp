@@ -236,14 +236,17 @@ TEST_F(AtlasGeocoderTest, CallsAStateTreeOrACountryNumberOutsideItsTableDamaged)
   EXPECT_EQ(at(-45, -90), "error: " + path_ + ": damaged table of countries");
 }
 
-TEST_F(AtlasGeocoderTest, ReadsNoLeafBeyondItsSection) {
-  tiny_.countryNodes = U32({Leaf(0), Leaf(2), Leaf(6), kNothing});
+TEST_F(AtlasGeocoderTest, CallsALeafThatLeadsBeyondItsSectionDamaged) {
+  tiny_.countryNodes = U32({Leaf(0), Leaf(2), Whole(1), kNothing});
   tiny_.countryLeaves = U32({1}) + U16({1, 60000}) +                     // vertices
                         U32({1000000}) + U16({1, 3, 0, 0, 1, 0, 0, 1});  // entries
+  tiny_.state(tiny_.name("Left"), 1);
+  tiny_.stateNodes = U32({kNothing, kNothing, Leaf(0), kNothing});
+  tiny_.stateLeaves = U32({2}) + U16({1, 3, 0, 0, 1, 0, 0, 1});  // the second entry is not there
   write(tiny_.bytes());
-  EXPECT_EQ(at(-45, -90), "open sea");
-  EXPECT_EQ(at(-45, 90), "open sea");
-  EXPECT_EQ(at(45, -90), "open sea");
+  EXPECT_EQ(at(-45, -90), "error: " + path_ + ": damaged tree of countries");
+  EXPECT_EQ(at(-45, 90), "error: " + path_ + ": damaged tree of countries");
+  EXPECT_EQ(at(45, -90), "error: " + path_ + ": damaged tree of states");
 }
 
 TEST_F(AtlasGeocoderTest, ReadsNoNameStateOrPlaceBeyondItsSection) {

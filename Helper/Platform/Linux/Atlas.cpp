@@ -53,7 +53,7 @@ std::optional<std::uint16_t> Atlas::countryAt(const Coordinate& place) const {
   while (const auto entry = leaf->next()) {
     if (entry->path.empty() || entry->path.holds(leaf->point())) return entry->id;
   }
-  return std::uint16_t{0};
+  return leaf->damaged() ? std::nullopt : std::optional(std::uint16_t{0});
 }
 
 std::optional<std::uint16_t> Atlas::stateAt(const Coordinate& place, std::uint16_t country) const {
@@ -73,7 +73,7 @@ std::optional<std::uint16_t> Atlas::stateAt(const Coordinate& place, std::uint16
       found = entry->id;
     }
   }
-  return found;
+  return leaf->damaged() ? std::nullopt : std::optional(found);
 }
 
 std::uint16_t Atlas::stateOfNearestPlace(const Coordinate& place, std::uint16_t country) const {

@@ -84,9 +84,10 @@ double AtlasPath::squaredDistance(const AtlasPoint& point, double xScale) const 
 }
 
 std::optional<AtlasEntry> AtlasLeaf::next() {
-  if (remaining_ == 0) return std::nullopt;
+  if (remaining_ == 0 || damaged_) return std::nullopt;
   --remaining_;
   if (entries_.empty()) return AtlasEntry{whole_, AtlasPath(AtlasBytes())};
+  damaged_ = true;  // unless the entry is whole
   const auto id = ReadAtlas<std::uint16_t>(entries_, offset_);
   const auto count = ReadAtlas<std::uint16_t>(entries_, offset_ + sizeof(std::uint16_t));
   if (!id || !count) return std::nullopt;
@@ -95,6 +96,7 @@ std::optional<AtlasEntry> AtlasLeaf::next() {
   if (length > entries_.size() - offset_) return std::nullopt;
   const AtlasPath path(entries_.subspan(offset_, length));
   offset_ += length;
+  damaged_ = false;
   return AtlasEntry{*id, path};
 }
 

@@ -55,8 +55,10 @@ class AtlasLeaf {
   AtlasLeaf(AtlasBytes entries, std::size_t offset, std::uint32_t count, const AtlasPoint& point)
       : entries_(entries), offset_(offset), remaining_(count), point_(point) {}
 
-  /// The next area; nothing after the last one, or where the file is damaged.
+  /// The next area; nothing after the last one, nor from where the file is damaged.
   [[nodiscard]] std::optional<AtlasEntry> next();
+  /// Whether damage, and not the last area, was the end.
+  [[nodiscard]] bool damaged() const { return damaged_; }
   /// The place that was asked for. Of no meaning in a cell that is all one area.
   [[nodiscard]] const AtlasPoint& point() const { return point_; }
 
@@ -65,6 +67,7 @@ class AtlasLeaf {
   AtlasBytes entries_;
   std::size_t offset_ = 0;
   std::uint32_t remaining_ = 0;
+  bool damaged_ = false;
   AtlasPoint point_;
 };
 
