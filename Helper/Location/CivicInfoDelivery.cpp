@@ -10,7 +10,7 @@ using platform::LogPriority;
 void SendCivicInfoToTelephony(const std::string& country, const std::string& state,
                               const std::string& city, const std::string& postalCode) {
   _VLServerConnectionAddIdentifierException(platform::String("HalvecMobileHelper"));
-  const auto connection =
+  auto connection =
       _VLServerConnectionCreate(platform::DefaultAllocator(), ServerConnectionCallback, nullptr);
   if (!connection) {
     Log(LogPriority::kError,
@@ -29,6 +29,7 @@ void SendCivicInfoToTelephony(const std::string& country, const std::string& sta
   } else {
     Log(LogPriority::kNotice, "sendCivicInfoToVL sent civic info to Halvec successfully");
   }
+  connection.reset();  // before the four texts go
 }
 
 void ServerConnectionCallback(platform::TelephonyConnection* /*connection*/, void* /*context*/) {
