@@ -2,6 +2,7 @@
 #include "Helper/Platform/Json.h"
 
 #include <charconv>
+#include <set>
 #include <string>
 #include <utility>
 
@@ -66,7 +67,7 @@ class Reader {
   /// `result` stays empty for null.
   bool value(std::optional<PropertyList>& result, int depth) {
     skipBlanks();
-    if (rest_.empty() || depth > kMaxDepth) return false;
+    if (rest_.empty()) return false;
     switch (rest_.front()) {
       case '{':
         return object(result, depth);
@@ -91,19 +92,22 @@ class Reader {
     }
   }
 
+  /// `depth` is the number of arrays and objects around this one.
   bool object(std::optional<PropertyList>& result, int depth) {
     (void)take('{');
+    if (depth == kMaxDepth) return false;
     PropertyList::Dictionary dictionary;
+    std::set<std::string> keys;  // those of nulls, too
     skipBlanks();
     if (!take('}')) {
       do {
         std::string key;
         std::optional<PropertyList> member;
         skipBlanks();
-        if (!string(key)) return false;
+        if (!string(key) || !keys.insert(key).second) return false;
         skipBlanks();
         if (!take(':') || !value(member, depth + 1)) return false;
-        if (member && !dictionary.insert(std::move(key), *std::move(member))) return false;
+        if (member) dictionary.set(std::move(key), *std::move(member));
         skipBlanks();
       } while (take(','));
       if (!take('}')) return false;
@@ -114,6 +118,7 @@ class Reader {
 
   bool array(std::optional<PropertyList>& result, int depth) {
     (void)take('[');
+    if (depth == kMaxDepth) return false;
     PropertyList::Array elements;
     skipBlanks();
     if (!take(']')) {

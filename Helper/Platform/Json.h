@@ -13,7 +13,8 @@ namespace platform {
 
 /// The value that `text` is: objects become dictionaries, numbers integers where they are written
 /// as such and fit into 64 bits, else reals. A null is left out where it is a member, and an empty
-/// dictionary elsewhere. None when `text` is not exactly one JSON value, nests deeper than 32, has
+/// dictionary elsewhere. None when `text` is not exactly one JSON value, nests arrays and
+/// objects deeper than 32, has
 /// a key twice, or a string with a NUL.
 [[nodiscard]] std::optional<PropertyList> ParseJson(std::string_view text);
 

@@ -102,15 +102,28 @@ TEST(Json, RefusesWhatIsNotExactlyOneValue) {
   for (const std::string& text : texts) EXPECT_EQ(ParseJson(text), std::nullopt) << text;
 }
 
-TEST(Json, RefusesAKeyThatIsThereTwice) { EXPECT_EQ(ParseJson(R"({"a":1,"a":1})"), std::nullopt); }
+TEST(Json, RefusesAKeyThatIsThereTwice) {
+  for (const char* text : {R"({"a":1,"a":1})", R"({"a":null,"a":1})", R"({"a":1,"a":null})",
+                           R"({"a":null,"a":null})", R"({"a":1,"\u0061":1})"}) {
+    EXPECT_EQ(ParseJson(text), std::nullopt) << text;
+  }
+  EXPECT_TRUE(ParseJson(R"({"a":{"a":1},"b":{"a":null}})")) << "each in an object of its own";
+}
 
 TEST(Json, NestsUpTo32Deep) {
-  const auto nested = [](std::size_t depth) {
+  const auto arrays = [](std::size_t depth) {
     return std::string(depth, '[') + std::string(depth, ']');
   };
-  EXPECT_TRUE(ParseJson(nested(33)));
-  EXPECT_FALSE(ParseJson(nested(34)));
-  EXPECT_FALSE(ParseJson(nested(1'000'000)));
+  const auto objects = [](std::size_t depth) {
+    std::string text = "1";
+    while (depth-- > 0) text = R"({"a":)" + text + "}";
+    return text;
+  };
+  EXPECT_TRUE(ParseJson(arrays(32)));
+  EXPECT_FALSE(ParseJson(arrays(33)));
+  EXPECT_TRUE(ParseJson(objects(32)));
+  EXPECT_FALSE(ParseJson(objects(33)));
+  EXPECT_FALSE(ParseJson(arrays(1'000'000)));
 }
 
 TEST(Json, RefusesEveryPrefixOfADocument) {
