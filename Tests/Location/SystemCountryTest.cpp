@@ -109,7 +109,7 @@ TEST_F(SystemCountry, IsNotThatOfAZoneWithoutOne) {
 TEST_F(SystemCountry, IsThatOfTheLocaleWhereTheZoneHasNone) {
   setZone("/usr/share/zoneinfo/Etc/UTC");
   for (const char* text : {"LANG=de_AT.UTF-8\n", "# x\nLC_TIME=C\nLANG=\"de_AT.UTF-8\"\n",
-                           "LANG='de_AT'", "LANG=de_AT@euro\nLANG=fr_FR\n"}) {
+                           "LANG='de_AT'", "LANG=fr_FR\nLANG=de_AT@euro\n"}) {
     folder.file("locale", text);
     EXPECT_EQ(code(), "AT") << text;
   }
@@ -121,7 +121,7 @@ TEST_F(SystemCountry, PassesOverALocaleWithoutACountryThatExists) {
   folder.file("locale", "LANG=de_AT.UTF-8\n");
   for (const char* text :
        {"LANG=C.UTF-8\n", "LANG=POSIX\n", "LANG=\n", "LANG=eo\n", "LANG=es_419\n", "LANG=en_XX\n",
-        "LANG=de_\n", "LANG=\"", "LANGUAGE=de_DE\n", ""}) {
+        "LANG=de_\n", "LANG=\"", "LANGUAGE=de_DE\n", "LANG=fr_FR\nLANG=\n", ""}) {
     folder.file("locale.conf", text);
     EXPECT_EQ(code(), "AT") << text;
   }

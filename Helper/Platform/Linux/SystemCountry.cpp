@@ -87,9 +87,11 @@ std::string ZoneOf(const std::string& localTime) {
   return std::string(name);
 }
 
-/// What LANG is set to in the text of a locale.conf(5); empty where it is not.
+/// What LANG is set to in the text of a locale.conf(5), at last if repeatedly; empty where it is
+/// not.
 std::string_view LanguageIn(std::string_view text) {
   constexpr std::string_view kAssignment = "LANG=";
+  std::string_view language;
   while (!text.empty()) {
     std::string_view line = TakeUpTo(text, '\n');
     if (!line.starts_with(kAssignment)) continue;
@@ -99,9 +101,9 @@ std::string_view LanguageIn(std::string_view text) {
       line.remove_prefix(1);
       line = TakeUpTo(line, quote);
     }
-    return line;
+    language = line;
   }
-  return {};
+  return language;
 }
 
 /// The territory of a locale's name: language[_territory][.codeset][@modifier].
