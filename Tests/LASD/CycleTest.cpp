@@ -115,6 +115,27 @@ TEST_F(Check, OfWhatIsCurrentTellsOnceThatNothingIsToDo) {
   EXPECT_EQ(retrieved().size(), 7U);
 }
 
+TEST_F(Check, TakesARecordThatCouldNotBeWrittenForOneUntilTheProcessEnds) {
+  offerAll("1");
+  store.setWritable(false);
+  check(8);
+  EXPECT_EQ(notification(), Named("UpdateFailed"));
+  EXPECT_EQ(text("gsm.db"), "gsm 1") << "the file is there";
+  (void)lines();
+  check(8);
+  EXPECT_EQ(notification(), Named("NoUpdateRequired"));
+  EXPECT_TRUE(isSilent());
+  EXPECT_EQ(lines().at(4), "gsm version 1 matches server version\n");
+  EXPECT_EQ(retrieved(),
+            (std::vector<std::string>{kLASDManifestURL, UrlOf("gsm"), kLASDManifestURL}));
+  EXPECT_FALSE(written("gsm"));
+  store.setWritable(true);
+  check(9);
+  EXPECT_EQ(notification(), Available("umts"));
+  EXPECT_TRUE(isSilent());
+  EXPECT_EQ(written("gsm"), Entry("1", UrlOf("gsm"))) << "together with the next record";
+}
+
 TEST_F(Check, OfNoTypeStillFetchesTheManifest) {
   offerAll("1");
   for (const std::uint32_t mask : {0U, 32U, 0xFFFFFFE0U}) {

@@ -98,6 +98,10 @@ class UpdaterFixture : public testing::Test {
   std::optional<PropertyList> recorded(const std::string& type) {
     return store.copyValue(type, domain);
   }
+  /// What another process would read.
+  std::optional<PropertyList> written(const std::string& type) {
+    return fakes::FakePreferencesStore(storage).copyValue(type, domain);
+  }
 
   void putManifestBytes(const std::string& body) {
     web.put(kLASDManifestURL, 200, {body.begin(), body.end()},
@@ -119,7 +123,9 @@ class UpdaterFixture : public testing::Test {
   files_test::FolderForTest folder;
   fakes::FakeSystemLog log;
   platform::ScopedReplacement<platform::SystemLog> logReplacement{log};
-  fakes::FakePreferencesStore store;
+  const std::shared_ptr<fakes::FakePreferencesStore::Storage> storage =
+      std::make_shared<fakes::FakePreferencesStore::Storage>();
+  fakes::FakePreferencesStore store{storage};
   platform::ScopedReplacement<platform::PreferencesStore> storeReplacement{store};
   fakes::FakeMessagePorts ports;
   platform::ScopedReplacement<platform::MessagePorts> portsReplacement{ports};
