@@ -80,6 +80,10 @@ TEST(LocationCountry, PrintsATextThatFillsItsSlotWhole) {
   EXPECT_EQ(Country(std::string(64, 'x')).outcome.output, std::string(64, 'x') + "\n");
 }
 
+TEST(LocationCountry, IsNoCommandToTheTerminal) {
+  EXPECT_EQ(Country("\x1b[2J").outcome.output, "\"\\u001b[2J\"\n");
+}
+
 TEST(LocationCountry, IsAbsentWhereTheHelperDoesNotKnow) {
   EXPECT_EQ(Country("").outcome.exitCode, 6);
   EXPECT_EQ(Country("").outcome.output, "");
@@ -167,6 +171,12 @@ TEST(LocationResolveWait, PrintsJson) {
   EXPECT_EQ(RunWaiting(ConnectionRequest(), CivicInfo(kZurich), {"--json"}).outcome.output,
             "{\"country\":\"CH\",\"state\":\"Zurich\",\"city\":\"Z\xc3\xbcrich\","
             "\"postalCode\":\"8001\"}\n");
+}
+
+TEST(LocationResolveWait, PrintsNoCommandToTheTerminal) {
+  const Bytes info = CivicInfo("<key>city</key><string>\x7f</string>");
+  EXPECT_NE(RunWaiting(ConnectionRequest(), info).outcome.output.find("city:        \"\\u007f\"\n"),
+            std::string::npos);
 }
 
 TEST(LocationResolveWait, KeepsNullApartFromEmpty) {

@@ -157,6 +157,8 @@ std::string Base64(std::span<const std::byte> bytes) {
   return out;
 }
 
+std::string Shown(const std::string& text) { return IsPrintable(text) ? text : JsonString(text); }
+
 bool IsPrintable(std::string_view text) {
   return platform::IsUtf8(text) && std::none_of(text.begin(), text.end(), [](unsigned char c) {
            return (c < 0x20 && c != '\t' && c != '\n' && c != '\r') || c == 0x7f;

@@ -25,6 +25,9 @@ namespace halvecctl {
 /// Whether `text` is valid UTF-8 without control characters other than tab and line ends.
 [[nodiscard]] bool IsPrintable(std::string_view text);
 
+/// Text that a terminal cannot mistake for commands: as it is where it is printable, else as JSON.
+[[nodiscard]] std::string Shown(const std::string& text);
+
 /// A property list as JSON. Data is a base64 string, a date a string in ISO 8601, a UID its number,
 /// and a number that JSON lacks the string "nan", "inf" or "-inf".
 [[nodiscard]] std::string JsonPropertyList(const platform::PropertyList& value);

@@ -153,9 +153,6 @@ std::map<std::string, std::uintmax_t> InstalledFiles() {
   return files;
 }
 
-/// Text that a terminal cannot mistake for commands.
-std::string Shown(const std::string& text) { return IsPrintable(text) ? text : JsonString(text); }
-
 /// The text of `key`, a dash without one.
 std::string ShownText(const PropertyList& entry, std::string_view key) {
   const PropertyList* value = entry.find(key);

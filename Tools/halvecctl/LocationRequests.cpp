@@ -22,7 +22,7 @@ constexpr std::chrono::seconds kDeliveryLimit{15};
 void PrintText(const CivicInfo& info) {
   constexpr std::array kLabels{"country:", "state:", "city:", "postal code:"};
   for (std::size_t index = 0; index < info.size(); ++index) {
-    std::printf("%-13s%s\n", kLabels[index], info[index].value_or("(null)").c_str());
+    std::printf("%-13s%s\n", kLabels[index], Shown(info[index].value_or("(null)")).c_str());
   }
 }
 
@@ -64,7 +64,7 @@ ExitCode RunCountry(const GlobalOptions& options, Words words) {
   if (options.json) {
     std::printf("{\"countryCode\":%s}\n", known ? JsonString(*code).c_str() : "null");
   } else if (known) {
-    std::printf("%s\n", (*code).c_str());
+    std::printf("%s\n", Shown(*code).c_str());
   }
   return known ? ExitCode::kDone : ExitCode::kAbsent;
 }

@@ -45,7 +45,7 @@ ExitCode RunGet(const GlobalOptions& options, const std::optional<std::string>& 
   if (options.json) {
     std::printf("%s\n", absent ? "null" : JsonString(*token).c_str());
   } else if (!absent) {
-    std::printf("%s\n", (IsPrintable(*token) ? *token : JsonString(*token)).c_str());
+    std::printf("%s\n", Shown(*token).c_str());
   }
   return absent ? ExitCode::kAbsent : ExitCode::kDone;
 }
