@@ -8,7 +8,9 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <linux/capability.h>
+#include <linux/sockios.h>
 #include <sched.h>
+#include <sys/ioctl.h>
 #include <sys/mman.h>
 #include <sys/mount.h>
 #include <sys/prctl.h>
@@ -20,6 +22,8 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <csignal>
+#include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <functional>
@@ -46,6 +50,9 @@ int Confined(const std::function<int()>& look) {
 
 /// 0 or the error of a system call's answer.
 int ErrorOf(long answer) { return answer < 0 ? errno : 0; }
+
+/// A descriptor that events can be told of by signals.
+int Socket() { return ::socket(AF_UNIX, SOCK_DGRAM, 0); }
 
 bool IsRoot() { return ::geteuid() == 0; }
 
@@ -110,9 +117,54 @@ TEST_F(Confinement, StartsThreadsAndNoProcesses) {
             EPERM);
 }
 
-TEST_F(Confinement, TouchesNoOtherProcess) {
+TEST_F(Confinement, LooksIntoNoOtherProcess) {
   EXPECT_EQ(Confined([] { return ErrorOf(::ptrace(PTRACE_ATTACH, ::getppid(), 0, 0)); }), EPERM);
-  EXPECT_EQ(Confined([] { return ErrorOf(::kill(::getppid(), 0)); }), EPERM);
+  for (const long call : {SYS_process_vm_readv, SYS_process_vm_writev, SYS_process_madvise,
+                          SYS_kcmp, SYS_pidfd_getfd}) {
+    EXPECT_EQ(Confined([call] { return ErrorOf(::syscall(call, 0, 0, 0, 0, 0, 0)); }), EPERM)
+        << call;
+  }
+}
+
+TEST_F(Confinement, SignalsNoOtherProcess) {
+  const pid_t stranger = ::getpid();
+  EXPECT_EQ(Confined([=] { return ErrorOf(::kill(stranger, 0)); }), EPERM);
+  EXPECT_EQ(Confined([=] { return ErrorOf(::tgkill(stranger, stranger, 0)); }), EPERM);
+  EXPECT_EQ(Confined([=] { return ErrorOf(::syscall(SYS_tkill, stranger, 0)); }), EPERM);
+}
+
+TEST_F(Confinement, HasTheKernelSignalNoOtherProcess) {
+  const pid_t stranger = ::getpid();
+  EXPECT_EQ(Confined([=] { return ErrorOf(::fcntl(Socket(), F_SETOWN, stranger)); }), EPERM);
+  EXPECT_EQ(Confined([=] {
+              const f_owner_ex owner{F_OWNER_PID, stranger};
+              return ErrorOf(::fcntl(Socket(), F_SETOWN_EX, &owner));
+            }),
+            EPERM);
+  for (const unsigned long request : {FIOSETOWN, SIOCSPGRP}) {
+    EXPECT_EQ(Confined([=] { return ErrorOf(::ioctl(Socket(), request, &stranger)); }), EPERM)
+        << request;
+  }
+}
+
+TEST_F(Confinement, StillEndsItselfWhenItMust) {
+  const pid_t child = ::fork();
+  if (child == 0) {
+    Confine();
+    ::abort();
+  }
+  int status = 0;
+  ASSERT_EQ(::waitpid(child, &status, 0), child);
+  EXPECT_TRUE(WIFSIGNALED(status));
+  EXPECT_EQ(WTERMSIG(status), SIGABRT);
+}
+
+TEST_F(Confinement, HasNeitherKeysNorRings) {
+  for (const long call : {SYS_add_key, SYS_request_key, SYS_keyctl, SYS_io_uring_setup,
+                          SYS_io_uring_enter, SYS_io_uring_register, SYS_userfaultfd}) {
+    EXPECT_EQ(Confined([call] { return ErrorOf(::syscall(call, 0, 0, 0, 0, 0, 0)); }), EPERM)
+        << call;
+  }
 }
 
 TEST_F(Confinement, HasOnlyTheSocketFamiliesThatRequestsUse) {

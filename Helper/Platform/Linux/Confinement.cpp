@@ -7,7 +7,6 @@
 
 #include <fcntl.h>
 #include <linux/capability.h>
-#include <linux/seccomp.h>
 #include <sched.h>
 #include <sys/mount.h>
 #include <sys/prctl.h>
@@ -103,14 +102,6 @@ bool CoverTheSystem() {
     if (!Cover(folder, MOUNT_ATTR_RDONLY)) covered = false;
   }
   return covered;
-}
-
-bool FilterSystemCalls() {
-  const auto program = SystemCallFilter();
-  // The kernel only reads it; its type is older than const.
-  const sock_fprog filter{static_cast<unsigned short>(program.size()),
-                          const_cast<sock_filter*>(program.data())};
-  return ::syscall(SYS_seccomp, SECCOMP_SET_MODE_FILTER, 0, &filter) == 0;
 }
 
 void Require(bool done, const char* what) {

@@ -5,13 +5,17 @@
 // that are opened later, the vendor's among them, may need it.
 #include "Helper/Platform/Linux/SystemCallFilter.h"
 
+#include <fcntl.h>
 #include <linux/audit.h>
+#include <linux/filter.h>
 #include <linux/sched.h>
 #include <linux/seccomp.h>
+#include <linux/sockios.h>
 #include <sys/mman.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <array>
@@ -78,11 +82,20 @@ constexpr std::array<std::uint32_t, 1> kExecutable{PROT_EXEC};
 constexpr std::array<std::uint32_t, 1> kWritableCode{PROT_WRITE | PROT_EXEC};
 constexpr std::uint32_t kSetIds = S_ISUID | S_ISGID;
 constexpr std::array<std::uint32_t, 1> kNone{0};
+constexpr std::array<std::uint32_t, 2> kOwnerCommands{F_SETOWN, F_SETOWN_EX};
+constexpr std::array<std::uint32_t, 2> kOwnerRequests{FIOSETOWN, SIOCSPGRP};
+/// Stands for the number of the process, which is known at its start only.
+constexpr std::array<std::uint32_t, 1> kThisProcess{~std::uint32_t{0}};
 
 constexpr std::array kConditions {
   Condition{SYS_socket, 0, kAll, kFamilies, true},
       // A thread, never a process.
       Condition{SYS_clone, 0, CLONE_THREAD, kThread, true},
+      // A signal to this process, as it takes to abort; nor may the kernel be asked to send one to
+      // another when something happens on a descriptor.
+      Condition{SYS_tgkill, 0, kAll, kThisProcess, true},
+      Condition{SYS_fcntl, 1, kAll, kOwnerCommands, false},
+      Condition{SYS_ioctl, 1, kAll, kOwnerRequests, false},
       // This process's own limits.
       Condition{SYS_prlimit64, 0, kAll, kNone, true},
       // No memory that is written first and run then.
@@ -211,8 +224,19 @@ constexpr auto kProgram = [] {
   return program;
 }();
 
+constexpr bool ComparesWithThisProcess(const sock_filter& instruction) {
+  return instruction.code == (BPF_JMP | BPF_K | BPF_JEQ) && instruction.k == kThisProcess[0];
+}
+static_assert(std::ranges::count_if(kProgram, ComparesWithThisProcess) == 1);
+
 }  // namespace
 
-std::span<const sock_filter> SystemCallFilter() { return kProgram; }
+bool FilterSystemCalls() {
+  auto program = kProgram;
+  std::ranges::find_if(program, ComparesWithThisProcess)->k =
+      static_cast<std::uint32_t>(::getpid());
+  const sock_fprog filter{program.size(), program.data()};
+  return ::syscall(SYS_seccomp, SECCOMP_SET_MODE_FILTER, 0, &filter) == 0;
+}
 
 }  // namespace platform
