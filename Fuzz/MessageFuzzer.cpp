@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 //
 // Feeds packets to a private port and to a service port, as a client could send them: the port
-// layer, every stub and the preferences proxy. The first byte picks the port and whether
-// descriptors come along; the rest is the packet. Whatever arrives, every name and descriptor must
-// be given back.
+// layer, every stub and every routine, on services in memory. The first byte picks the port and
+// whether descriptors come along; the rest is the packet. Whatever arrives, every name and
+// descriptor must be given back. One thread, beside those of the work that requests start.
 #include <fcntl.h>
 #include <sys/mman.h>
 #include <sys/socket.h>
@@ -12,17 +12,36 @@
 #include <memory>
 
 #include "Helper/Platform/PortMessage.h"
+#include "Helper/Platform/vlu/HttpTransport.h"
 #include "Helper/Shared/Server/ConnectSubsystem.h"
 #include "Helper/Shared/Server/RequestCatalogue.h"
+#include "Tests/Fakes/FakeArchiveCopier.h"
 #include "Tests/Fakes/FakeCallerSecurity.h"
+#include "Tests/Fakes/FakeDirectoryEntries.h"
+#include "Tests/Fakes/FakeEchoService.h"
+#include "Tests/Fakes/FakeFileManager.h"
+#include "Tests/Fakes/FakeMapService.h"
 #include "Tests/Fakes/FakeMessagePorts.h"
 #include "Tests/Fakes/FakePreferencesStore.h"
 #include "Tests/Fakes/FakeSystemLog.h"
+#include "Tests/Fakes/FakeUserDatabase.h"
 #include "Tests/Fakes/FakeVoicemailTokenStore.h"
 #include "Tests/Support/WireClient.h"
 
 namespace {
 
+/// Reaches nothing.
+class NoWeb final : public vlu::Http::HttpTransport {
+ public:
+  bool accepts(const std::string& /*url*/) override { return false; }
+  std::shared_ptr<vlu::Http::HttpResponse> retrieve(
+      const vlu::Http::Transfer& /*transfer*/) override {
+    return nullptr;
+  }
+};
+
+/// Whatever a request may change or open is in memory: this runs on somebody's own machine, and a
+/// descriptor that another thread opens meanwhile would be taken for a lost one.
 struct Bench {
   fakes::FakeSystemLog log;
   platform::ScopedReplacement<platform::SystemLog> logReplacement{log};
@@ -34,6 +53,22 @@ struct Bench {
   platform::ScopedReplacement<platform::VoicemailTokenStore> tokensReplacement{tokens};
   fakes::FakeMessagePorts ports;  // none is published
   platform::ScopedReplacement<platform::MessagePorts> portsReplacement{ports};
+  fakes::FakeFileManager files;
+  platform::ScopedReplacement<platform::FileManager> filesReplacement{files};
+  fakes::FakeDirectoryEntries entries;
+  platform::ScopedReplacement<platform::DirectoryEntries> entriesReplacement{entries};
+  fakes::FakeArchiveCopierFactory archives;
+  platform::ScopedReplacement<platform::ArchiveCopierFactory> archivesReplacement{archives};
+  fakes::FakeUserDatabase users;
+  platform::ScopedReplacement<platform::UserDatabase> usersReplacement{users};
+  fakes::FakeMapService maps;
+  platform::ScopedReplacement<platform::MapService> mapsReplacement{maps};
+  fakes::FakeCountryConfiguration country;
+  platform::ScopedReplacement<platform::CountryConfiguration> countryReplacement{country};
+  fakes::FakeEchoService network;
+  platform::ScopedReplacement<platform::EchoService> networkReplacement{network};
+  NoWeb web;
+  platform::ScopedReplacement<vlu::Http::HttpTransport> webReplacement{web};
   platform::ReceiveBuffer buffer;
   PortName port = kPortNull;
 
@@ -57,6 +92,9 @@ struct Bench {
     while (!support::ReceivePacket(sender->get()).bytes.empty()) {
     }
     (void)log.takeLines();
+    (void)network.takeSent();
+    maps.submissions.clear();
+    archives.copies.clear();
   }
 };
 
