@@ -8,9 +8,10 @@
 #include <sys/vfs.h>
 
 #include <array>
-#include <cstdio>
 #include <cstdlib>
 #include <string_view>
+
+#include "Helper/Platform/Linux/ProcessFile.h"
 
 namespace platform {
 namespace {
@@ -19,9 +20,7 @@ constexpr long kPidFileSystem = 0x50494446;
 
 /// Field 22 of /proc/PID/stat (proc(5)): start time in clock ticks since boot.
 std::uint32_t StartTime(pid_t process) {
-  std::array<char, 32> path{};
-  std::snprintf(path.data(), path.size(), "/proc/%d/stat", process);
-  FileDescriptor file(::open(path.data(), O_RDONLY | O_CLOEXEC));
+  const FileDescriptor file = OpenProcessFile(process, "stat", O_RDONLY);
   std::array<char, 1024> content{};
   const ssize_t length = file ? ::read(file.get(), content.data(), content.size() - 1) : -1;
   if (length <= 0) return 0;

@@ -15,6 +15,7 @@
 #include <sys/mount.h>
 #include <sys/prctl.h>
 #include <sys/ptrace.h>
+#include <sys/shm.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
@@ -31,6 +32,7 @@
 #include <thread>
 
 #include "Helper/Platform/Linux/FileLocation.h"
+#include "Helper/Platform/Linux/ProcessFile.h"
 
 namespace platform {
 namespace {
@@ -298,10 +300,36 @@ TEST_F(Confinement, SeesTheExecutableOfAnotherUsersProcess) {
     if (::setresuid(12345, 12345, 12345) != 0) ::_exit(1);
     while (true) ::pause();
   }
+  EXPECT_EQ(Confined([=] { return OpenProcessFile(stranger, "exe", O_PATH) ? 0 : errno; }), 0);
   const std::string path = "/proc/" + std::to_string(stranger) + "/exe";
-  EXPECT_EQ(Confined([&path] { return ErrorOf(::open(path.c_str(), O_PATH)); }), 0);
+  EXPECT_EQ(Confined([&] {
+              (void)OpenProcessFile(stranger, "exe", O_PATH);
+              return ErrorOf(::open(path.c_str(), O_PATH));
+            }),
+            EACCES)
+      << "and not a moment longer than it takes";
   ::kill(stranger, SIGKILL);
   ::waitpid(stranger, nullptr, 0);
+}
+
+TEST_F(Confinement, ReachesNothingThroughAnotherProcess) {
+  if (!IsRoot()) GTEST_SKIP() << "only root may look at what others have open at all";
+  const std::string process = "/proc/" + std::to_string(::getpid());
+  for (const char* door : {"/root/etc", "/cwd", "/mem", "/environ"}) {
+    EXPECT_EQ(Confined([&] { return ErrorOf(::open((process + door).c_str(), O_RDONLY)); }), EACCES)
+        << door;
+  }
+}
+
+TEST_F(Confinement, RunsNoSharedMemoryEither) {
+  EXPECT_EQ(Confined([] {
+              const int segment = ::shmget(IPC_PRIVATE, 4096, 0700);
+              void* const at = ::shmat(segment, nullptr, SHM_EXEC);
+              const int error = at == reinterpret_cast<void*>(-1) ? errno : 0;
+              ::shmctl(segment, IPC_RMID, nullptr);
+              return error;
+            }),
+            EPERM);
 }
 
 TEST_F(Confinement, SeesWhatOthersMountLater) {

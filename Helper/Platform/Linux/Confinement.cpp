@@ -19,20 +19,12 @@
 #include <cstring>
 
 #include "Helper/Platform/FileDescriptor.h"
+#include "Helper/Platform/Linux/Capabilities.h"
 #include "Helper/Platform/Linux/SystemCallFilter.h"
 #include "Helper/Platform/SystemLog.h"
 
 namespace platform {
 namespace {
-
-/// The sets of one thread, 64 capabilities each.
-struct Capabilities {
-  std::array<__user_cap_data_struct, _LINUX_CAPABILITY_U32S_3> words{};
-
-  [[nodiscard]] bool has(unsigned capability) const {
-    return (words[CAP_TO_INDEX(capability)].effective & CAP_TO_MASK(capability)) != 0;
-  }
-};
 
 /// Each with the request that needs it.
 constexpr auto kNeeded = std::to_array<unsigned>({
@@ -43,13 +35,8 @@ constexpr auto kNeeded = std::to_array<unsigned>({
     CAP_NET_RAW,       // TriggerHeartbeat: echo requests
 });
 
-Capabilities CurrentCapabilities() {
-  Capabilities current;
-  __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
-  (void)::syscall(SYS_capget, &header, current.words.data());  // nobody's, should it fail
-  return current;
-}
-
+/// Keeps the needed ones. CAP_SYS_PTRACE is not in effect but while OpenProcessFile() runs: it lets
+/// a path lead through /proc/PID/root, around everything that is covered here.
 bool KeepNeeded(const Capabilities& current) {
   Capabilities kept;
   for (const unsigned capability : kNeeded) {
@@ -57,8 +44,8 @@ bool KeepNeeded(const Capabilities& current) {
     word.permitted |= CAP_TO_MASK(capability) & current.words[CAP_TO_INDEX(capability)].permitted;
     word.effective = word.permitted;
   }
-  __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
-  return ::syscall(SYS_capset, &header, kept.words.data()) == 0;
+  kept.words[CAP_TO_INDEX(CAP_SYS_PTRACE)].effective &= ~CAP_TO_MASK(CAP_SYS_PTRACE);
+  return SetCapabilities(kept);
 }
 
 /// A copy of what is mounted at `path` and, if it is a folder, below it; empty when there is none.

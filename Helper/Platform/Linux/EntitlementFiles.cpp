@@ -6,13 +6,12 @@
 #include <sys/stat.h>
 
 #include <algorithm>
-#include <array>
 #include <cstddef>
-#include <cstdio>
 #include <span>
 #include <string_view>
 #include <utility>
 
+#include "Helper/Platform/Linux/ProcessFile.h"
 #include "Helper/Platform/Linux/TrustedPath.h"
 #include "Helper/Platform/ProcessIdentity.h"
 #include "Helper/Platform/UserDatabase.h"
@@ -139,10 +138,8 @@ std::unique_ptr<SecurityTask> EntitlementFiles::createTask(const wire::AuditToke
   if (!pidfd || ProcessVersion(pidfd.get(), process) != AuditTokenProcessVersion(token)) {
     return nullptr;
   }
-  std::array<char, 32> path{};
-  std::snprintf(path.data(), path.size(), "/proc/%d/exe", process);
   // O_PATH through the link: the running file itself, whatever stands under its name now.
-  const FileDescriptor executable(::open(path.data(), O_PATH | O_CLOEXEC));
+  const FileDescriptor executable = OpenProcessFile(process, "exe", O_PATH);
   struct stat status {};
   if (!executable || ::fstat(executable.get(), &status) != 0) return nullptr;
   return std::make_unique<Task>(std::move(pidfd), status, user, directories_);

@@ -12,6 +12,7 @@
 #include <linux/seccomp.h>
 #include <linux/sockios.h>
 #include <sys/mman.h>
+#include <sys/shm.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
@@ -44,7 +45,7 @@ constexpr std::array kRefused {
       SYS_rt_tgsigqueueinfo, SYS_process_madvise, SYS_process_mrelease,
       // Other identities.
       SYS_setuid, SYS_setgid, SYS_setreuid, SYS_setregid, SYS_setresuid, SYS_setresgid,
-      SYS_setfsuid, SYS_setfsgid, SYS_setgroups, SYS_capset, SYS_personality,
+      SYS_setfsuid, SYS_setfsgid, SYS_setgroups, SYS_personality,
       // Another view of the file system, and files that no folder leads to.
       SYS_mount, SYS_umount2, SYS_move_mount, SYS_open_tree, SYS_fsopen, SYS_fsconfig, SYS_fsmount,
       SYS_fspick, SYS_mount_setattr, SYS_pivot_root, SYS_chroot, SYS_unshare, SYS_setns,
@@ -79,6 +80,7 @@ constexpr std::uint32_t kAll = ~std::uint32_t{0};
 constexpr std::array<std::uint32_t, 4> kFamilies{AF_UNIX, AF_INET, AF_INET6, AF_NETLINK};
 constexpr std::array<std::uint32_t, 1> kThread{CLONE_THREAD};
 constexpr std::array<std::uint32_t, 1> kExecutable{PROT_EXEC};
+constexpr std::array<std::uint32_t, 1> kExecutableSegment{SHM_EXEC};
 constexpr std::array<std::uint32_t, 1> kWritableCode{PROT_WRITE | PROT_EXEC};
 constexpr std::uint32_t kSetIds = S_ISUID | S_ISGID;
 constexpr std::array<std::uint32_t, 1> kNone{0};
@@ -102,6 +104,7 @@ constexpr std::array kConditions {
       Condition{SYS_mmap, 2, PROT_WRITE | PROT_EXEC, kWritableCode, false},
       Condition{SYS_mprotect, 2, PROT_EXEC, kExecutable, false},
       Condition{SYS_pkey_mprotect, 2, PROT_EXEC, kExecutable, false},
+      Condition{SYS_shmat, 2, SHM_EXEC, kExecutableSegment, false},
       // No file that gives its owner's rights to whoever runs it.
       Condition{SYS_fchmod, 1, kSetIds, kNone, true},
       Condition{SYS_fchmodat, 2, kSetIds, kNone, true},
