@@ -82,6 +82,8 @@ TEST(LocationCountry, PrintsATextThatFillsItsSlotWhole) {
 
 TEST(LocationCountry, IsNoCommandToTheTerminal) {
   EXPECT_EQ(Country("\x1b[2J").outcome.output, "\"\\u001b[2J\"\n");
+  EXPECT_EQ(Country("\xc2\x9bK").outcome.output, "\"\\u009bK\"\n");
+  EXPECT_EQ(Country("\xc2\xa0K").outcome.output, "\xc2\xa0K\n");
 }
 
 TEST(LocationCountry, IsAbsentWhereTheHelperDoesNotKnow) {

@@ -32,6 +32,15 @@ std::size_t SequenceLength(std::string_view text) {
   return 0;
 }
 
+/// The control character that `text` begins with: of C0, DEL, or of C1, which terminals obey too.
+std::optional<unsigned> ControlAt(std::string_view text) {
+  const auto byte = static_cast<unsigned char>(text.front());
+  if (byte < 0x20 || byte == 0x7f) return byte;
+  if (byte != 0xc2 || text.size() < 2) return std::nullopt;
+  const auto second = static_cast<unsigned char>(text[1]);
+  return second < 0xa0 ? std::optional<unsigned>(second) : std::nullopt;
+}
+
 void AppendEscaped(std::string& out, std::string_view sequence) {
   const char first = sequence.front();
   switch (first) {
@@ -52,13 +61,13 @@ void AppendEscaped(std::string& out, std::string_view sequence) {
     default:
       break;
   }
-  const auto byte = static_cast<unsigned char>(first);
-  if (byte >= 0x20 && byte != 0x7f) {
+  const std::optional<unsigned> control = ControlAt(sequence);
+  if (!control) {
     out += sequence;
     return;
   }
   std::array<char, 8> code{};
-  (void)std::snprintf(code.data(), code.size(), "\\u%04x", byte);  // always fits
+  (void)std::snprintf(code.data(), code.size(), "\\u%04x", *control);  // always fits
   out += code.data();
 }
 
@@ -160,9 +169,12 @@ std::string Base64(std::span<const std::byte> bytes) {
 std::string Shown(const std::string& text) { return IsPrintable(text) ? text : JsonString(text); }
 
 bool IsPrintable(std::string_view text) {
-  return platform::IsUtf8(text) && std::none_of(text.begin(), text.end(), [](unsigned char c) {
-           return (c < 0x20 && c != '\t' && c != '\n' && c != '\r') || c == 0x7f;
-         });
+  constexpr std::string_view kHarmless = "\t\n\r";
+  if (!platform::IsUtf8(text)) return false;
+  for (; !text.empty(); text.remove_prefix(SequenceLength(text))) {
+    if (ControlAt(text) && kHarmless.find(text.front()) == kHarmless.npos) return false;
+  }
+  return true;
 }
 
 std::string JsonData(std::span<const std::byte> bytes) {
