@@ -86,7 +86,7 @@ KernReturn PortAllocate(PortName& name) {
     return KERN_RESOURCE_SHORTAGE;
   }
   PortEntry entry;
-  entry.receive = std::make_shared<const FileDescriptor>(ends[0]);
+  entry.receive = SharePairEnd(FileDescriptor(ends[0]));
   entry.send = std::make_shared<const FileDescriptor>(ends[1]);
   // The sender of each request is known from its message, not from who made the pair.
   const int on = 1;
@@ -126,7 +126,7 @@ KernReturn PortDeallocate(PortName name) {
 
 PortName PortAdoptSendRight(FileDescriptor right, SharedDescriptor holder) {
   PortEntry entry;
-  entry.send = std::make_shared<const FileDescriptor>(std::move(right));
+  entry.send = SharePairEnd(std::move(right));
   entry.sendReferences = 1;
   entry.holder = std::move(holder);
   return PortInsertEntry(std::move(entry));

@@ -6,16 +6,13 @@
 #pragma once
 
 #include <cstddef>
-#include <memory>
 #include <optional>
 
 #include "Helper/Platform/FileDescriptor.h"
+#include "Helper/Platform/ForeignDescriptor.h"
 #include "Helper/Shared/Interface/Message.h"
 
 namespace platform {
-
-/// A descriptor that lives as long as its name or anybody who still uses it.
-using SharedDescriptor = std::shared_ptr<const FileDescriptor>;
 
 /// Makes a port and gives its receive right a new name.
 /// KERN_SUCCESS; KERN_RESOURCE_SHORTAGE when the process has no descriptors left.

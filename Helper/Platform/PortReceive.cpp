@@ -14,23 +14,24 @@
 namespace platform {
 namespace {
 
-/// More than any message may carry, so that a surplus is seen and closed rather than cut silently:
-/// the kernel installs as many as fit before it says that some were lost.
-constexpr std::size_t kControlDescriptors = 8;
 constexpr uid_t kOverflowId = 65534;
 constexpr int kRequiredSeals = F_SEAL_SHRINK | F_SEAL_GROW | F_SEAL_WRITE;
 
 std::uint32_t AlignedTrailerOffset(std::uint32_t size) { return (size + 3U) & ~3U; }
 
-/// Reads a whole sealed memfd. pread leaves the sender's file offset alone, and a copy in own
-/// memory cannot fault or change.
-bool ReadSealed(int descriptor, std::unique_ptr<std::byte[]>& memory, std::size_t size) {
+/// Whether this is a memfd of exactly `size` bytes that nobody can change any more.
+bool IsSealed(int descriptor, std::size_t size) {
   // The seals come before the size: only then can the size no longer change.
   const int seals = ::fcntl(descriptor, F_GET_SEALS);
   if (seals < 0 || (seals & kRequiredSeals) != kRequiredSeals) return false;
   struct stat status {};
   if (::fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode)) return false;
-  if (status.st_size < 0 || static_cast<std::size_t>(status.st_size) != size) return false;
+  return status.st_size >= 0 && static_cast<std::size_t>(status.st_size) == size;
+}
+
+/// Reads a whole sealed memfd. pread leaves the sender's file offset alone, and a copy in own
+/// memory cannot fault or change.
+bool ReadSealed(int descriptor, std::unique_ptr<std::byte[]>& memory, std::size_t size) {
   memory = std::make_unique_for_overwrite<std::byte[]>(size);
   std::size_t done = 0;
   while (done < size) {
@@ -44,28 +45,19 @@ bool ReadSealed(int descriptor, std::unique_ptr<std::byte[]>& memory, std::size_
 
 }  // namespace
 
-/// What came in the control messages. Descriptors are owned from here on; those that nobody takes
-/// are closed with this object.
+/// What came with the bytes of a message.
 struct ReceiveBuffer::Control {
-  std::array<FileDescriptor, kControlDescriptors> descriptors;
-  std::size_t count = 0;
-  std::size_t next = 0;
+  ForeignDescriptors descriptors;
   ucred credentials{.pid = 0, .uid = kOverflowId, .gid = kOverflowId};
   FileDescriptor pidfd;
 
   explicit Control(msghdr& message) {
     for (cmsghdr* entry = CMSG_FIRSTHDR(&message); entry; entry = CMSG_NXTHDR(&message, entry)) {
+      descriptors.add(*entry);
       if (entry->cmsg_level != SOL_SOCKET) continue;
       const auto* data = CMSG_DATA(entry);
       const std::size_t size = entry->cmsg_len - CMSG_LEN(0);
-      if (entry->cmsg_type == SCM_RIGHTS) {
-        for (std::size_t at = 0; at + sizeof(int) <= size; at += sizeof(int)) {
-          int descriptor = -1;
-          std::memcpy(&descriptor, data + at, sizeof descriptor);
-          FileDescriptor owned(descriptor);
-          if (count < descriptors.size()) descriptors[count++] = std::move(owned);
-        }
-      } else if (entry->cmsg_type == SCM_CREDENTIALS && size == sizeof credentials) {
+      if (entry->cmsg_type == SCM_CREDENTIALS && size == sizeof credentials) {
         std::memcpy(&credentials, data, sizeof credentials);
       } else if (entry->cmsg_type == kControlPidfd && size == sizeof(int)) {
         int descriptor = -1;  // the kernel puts a negative error number here when it had no room
@@ -75,9 +67,6 @@ struct ReceiveBuffer::Control {
     }
   }
 
-  [[nodiscard]] FileDescriptor take() {
-    return next < count ? std::move(descriptors[next++]) : FileDescriptor();
-  }
   /// Credentials that were not asked for in time arrive as process 0 and the overflow user.
   [[nodiscard]] bool knowsSender() const { return credentials.pid > 0; }
 };
@@ -91,7 +80,7 @@ void ReceiveBuffer::clear() {
   for (std::size_t index = 0; index < rightCount_; ++index) PortDeallocate(rights_[index]);
   rightCount_ = 0;
   memory_.clear();
-  replyRight_.reset();
+  ClosePairEnd(std::move(replyRight_));
   sender_.reset();
 }
 
@@ -99,9 +88,7 @@ ReceiveStatus ReceiveBuffer::receive(PortName name, int socket, bool named) {
   clear();
   message_ = storage_.get() + kHeadRoom;
   iovec part{.iov_base = message_, .iov_len = kMaxMessageSize + kMaxInlineData};
-  alignas(cmsghdr) std::array<std::byte, CMSG_SPACE(sizeof(int) * kControlDescriptors) +
-                                             CMSG_SPACE(sizeof(ucred)) + CMSG_SPACE(sizeof(int))>
-      controlStorage;
+  alignas(cmsghdr) ControlStorage controlStorage;
   msghdr message{};
   message.msg_iov = &part;
   message.msg_iovlen = 1;
@@ -120,8 +107,8 @@ ReceiveStatus ReceiveBuffer::receive(PortName name, int socket, bool named) {
     return ReceiveStatus::kNothing;  // there is no id to answer to
   }
   if ((header().bits & wire::kRemoteDispositionMask) != 0) {
-    replyRight_ = control.take();
-    if (replyRight_ && !IsAnonymousPort(replyRight_.get())) replyRight_.reset();
+    replyRight_ = control.descriptors.take();
+    if (replyRight_ && !IsAnonymousPort(replyRight_.get())) CloseForeign(std::move(replyRight_));
     // A named port has no way back of its own, and a private one must not answer where it was not
     // asked to; a lost or unfit reply right means no reply.
     if (!replyRight_ && !named) return ReceiveStatus::kNothing;
@@ -183,10 +170,12 @@ bool ReceiveBuffer::readDescriptors(std::size_t length, Control& control) {
                                     disposition == wire::kCopySend ||
                                     disposition == wire::kMakeSend;
       PortName name = kPortNull;
-      FileDescriptor right = control.take();
+      FileDescriptor right = control.descriptors.take();
       if (right && carriesSendRight && IsAnonymousPort(right.get())) {
         name = PortAdoptSendRight(std::move(right), sender_);
         rights_[rightCount_++] = name;
+      } else {
+        CloseForeign(std::move(right));
       }
       wire::Store(descriptor, name);
       at += wire::kPortDescriptorSize;
@@ -209,9 +198,14 @@ bool ReceiveBuffer::readMemory(std::byte* descriptor, std::size_t& inlineAt, std
   const std::byte* bytes = nullptr;
   if (size > kMaxOutOfLineData || place > 1) return false;
   if (place == 1 && size > 0) {
+    FileDescriptor file = control.descriptors.take();
+    if (!file || !IsSealed(file.get(), size)) {
+      CloseForeign(std::move(file));
+      return false;
+    }
     Memory& memory = memory_.emplace_back();
-    memory.file = control.take();
-    if (!memory.file || !ReadSealed(memory.file.get(), memory.bytes, size)) return false;
+    memory.file = std::move(file);
+    if (!ReadSealed(memory.file.get(), memory.bytes, size)) return false;
     bytes = memory.bytes.get();
   } else if (size > 0) {
     if (size > length - inlineAt) return false;

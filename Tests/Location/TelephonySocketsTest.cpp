@@ -11,6 +11,7 @@
 #include <thread>
 
 #include "Tests/Location/DaemonInTest.h"
+#include "Tests/Support/LingeringSocket.h"
 
 namespace {
 
@@ -254,6 +255,18 @@ TEST_F(TelephonySockets, HaveNoConnectionWithoutFreeDescriptors) {
     ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &limit), 0);
     EXPECT_EQ(support::OpenDescriptors(), before);
   }
+}
+
+TEST_F(TelephonySockets, DoNotWaitForDescriptorsThatTheDaemonSendsAlong) {
+  // Who does wait for them waits ten minutes.
+  support::LingeringSocket slow;
+  open(kAmple);
+  ASSERT_EQ(support::SendPacket(daemon.connection(), {}, {slow.get()}), 0);
+  daemon.say(Answer(0, 7));
+  ASSERT_EQ(support::SendPacket(daemon.connection(), {}, {slow.get()}), 0);
+  slow.leave();
+  EXPECT_EQ(call(), (TelephonyResult{.domain = 0, .errorCode = 7}));
+  connection.reset();
 }
 
 }  // namespace

@@ -3,6 +3,7 @@
 // The connect message, byte for byte.
 #include <sys/socket.h>
 
+#include "Helper/Platform/ForeignDescriptor.h"
 #include "Helper/Platform/UnixSocketAddress.h"
 #include "Helper/Shared/Server/ConnectSubsystem.h"
 #include "Tests/Support/ServerFixture.h"
@@ -81,6 +82,7 @@ TEST_F(ConnectWire, WithACopySendOrMakeSendDescriptorGetsMinus300) {
     Bytes request = support::ConnectRequest();
     request[38] = static_cast<std::uint8_t>(disposition);
     EXPECT_EQ(replyTo(request), errorReply(-300)) << disposition;
+    platform::ForeignCloseQueue().sync([] {});
     EXPECT_TRUE(support::IsHungUp(client.ownPort.get())) << "the right must be given back";
   }
 }

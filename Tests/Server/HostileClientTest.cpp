@@ -76,10 +76,16 @@ TEST_F(HostileClient, SendingRightsThatNoMessageCarriesHasThemClosed) {
   expectGoodClientIsServed();
 }
 
-TEST_F(HostileClient, SendingMoreRightsThanFitIsToldOfTheShortage) {
+TEST_F(HostileClient, SendingMoreRightsThanThereAreDescriptorsIsToldOfTheShortage) {
   const support::FileDescriptor file(::open("/dev/null", O_RDONLY | O_CLOEXEC));
-  const support::Packet reply =
-      request(*bad, support::Message(8683551, 24), std::vector<int>(40, file.get()));
+  ASSERT_EQ(support::SendPacket(bad->privatePort.get(), support::Message(8683551, 24),
+                                std::vector<int>(40, file.get())),
+            0);
+  {
+    const support::DescriptorLimit none(0);
+    pump();
+  }
+  const support::Packet reply = support::ReceivePacket(bad->privatePort.get());
   EXPECT_EQ(Get<std::int32_t>(reply.bytes, 32), 6);
 }
 

@@ -1,5 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "Tests/Support/WireClient.h"
+
+#include "Helper/Platform/ForeignDescriptor.h"
 #include "Helper/Platform/UnixSocketAddress.h"
 
 #include <dirent.h>
@@ -189,6 +191,7 @@ Bytes WireClient::takeConnectReply(bool wait) {
 }
 
 std::size_t OpenDescriptors() {
+  platform::ForeignCloseQueue().sync([] {});
   DIR* folder = ::opendir("/proc/self/fd");
   std::size_t count = 0;
   while (folder && ::readdir(folder)) ++count;

@@ -101,7 +101,7 @@ class WireClient {
   std::string servicePath_;
 };
 
-/// How many descriptors this process has open.
+/// How many descriptors this process has open once those that it gave up are closed.
 [[nodiscard]] std::size_t OpenDescriptors();
 
 }  // namespace support

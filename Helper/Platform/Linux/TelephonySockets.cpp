@@ -12,6 +12,7 @@
 #include <variant>
 
 #include "Helper/Platform/FileDescriptor.h"
+#include "Helper/Platform/ForeignDescriptor.h"
 #include "Helper/Platform/HandsetError.h"
 #include "Helper/Platform/Linux/MessagePortSocket.h"
 #include "Helper/Platform/PollTimeout.h"
@@ -45,6 +46,9 @@ class Connection final : public TelephonyConnection {
         answerLimit_(answerLimit),
         callback_(callback),
         context_(context) {}
+  ~Connection() override { ClosePairEnd(std::move(socket_)); }
+  Connection(const Connection&) = delete;
+  Connection& operator=(const Connection&) = delete;
 
   TelephonyResult setCivicInfo(const CivicInfoTexts& texts) override {
     const std::optional<Datagram> payload = SerializeBinary(CivicInfo(texts));
@@ -96,14 +100,29 @@ class Connection final : public TelephonyConnection {
       if (static_cast<std::size_t>(length) > wire::OneWaySize(wire::kOneWayPayloadLimit)) {
         return Failure(handset::kInvalidArgument);
       }
-      // Descriptors that come along find no room here, so the kernel closes them.
       Datagram packet(static_cast<std::size_t>(length));
-      (void)::recv(socket_.get(), packet.data(), packet.size(), MSG_DONTWAIT);  // it is there
+      take(packet);
       if (!packet.empty()) return packet;
     }
   }
 
-  const FileDescriptor socket_;
+  /// Takes the packet that is there; descriptors that came along are given up.
+  void take(Datagram& packet) {
+    iovec part{.iov_base = packet.data(), .iov_len = packet.size()};
+    alignas(cmsghdr) ControlStorage control;
+    msghdr header{};
+    header.msg_iov = &part;
+    header.msg_iovlen = 1;
+    header.msg_control = control.data();
+    header.msg_controllen = control.size();
+    if (::recvmsg(socket_.get(), &header, MSG_DONTWAIT | MSG_CMSG_CLOEXEC) < 0) return;
+    ForeignDescriptors surplus;
+    for (cmsghdr* entry = CMSG_FIRSTHDR(&header); entry; entry = CMSG_NXTHDR(&header, entry)) {
+      surplus.add(*entry);
+    }
+  }
+
+  FileDescriptor socket_;
   const Duration answerLimit_;
   const TelephonyNotificationCallback callback_;
   void* const context_;
