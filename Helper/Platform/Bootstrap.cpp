@@ -149,29 +149,6 @@ KernReturn Bind(const std::string& directory, const std::string& service, PortEn
 
 }  // namespace
 
-BoundPath::BoundPath(std::string path) : path_(std::move(path)) {
-  struct stat status {};
-  if (::lstat(path_.c_str(), &status) != 0) path_.clear();
-  device_ = status.st_dev;
-  inode_ = status.st_ino;
-}
-
-BoundPath::BoundPath(BoundPath&& other) noexcept
-    : path_(std::exchange(other.path_, {})), device_(other.device_), inode_(other.inode_) {}
-
-BoundPath& BoundPath::operator=(BoundPath&& other) noexcept {
-  std::swap(path_, other.path_);
-  std::swap(device_, other.device_);
-  std::swap(inode_, other.inode_);
-  return *this;
-}
-
-BoundPath::~BoundPath() {
-  struct stat status {};
-  if (path_.empty() || ::lstat(path_.c_str(), &status) != 0) return;
-  if (status.st_dev == device_ && status.st_ino == inode_) (void)::unlink(path_.c_str());
-}
-
 KernReturn BootstrapCheckIn(const char* serviceName, PortName& name) {
   const std::string_view service(serviceName);
   if (service.empty() || service.front() == '.' || service.find('/') != std::string_view::npos) {

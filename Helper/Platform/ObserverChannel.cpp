@@ -79,14 +79,16 @@ std::unique_ptr<ObserverChannel> ObserverChannel::Open(RunLoop& loop, const std:
   FileDescriptor socket = Listen(path);
   if (!socket) return nullptr;
   std::unique_ptr<ObserverChannel> channel(
-      new ObserverChannel(loop, std::move(socket), std::move(snapshot)));
+      new ObserverChannel(loop, std::move(socket), path, std::move(snapshot)));
   if (!channel->watch_->open(channel->socket_.get())) return nullptr;
   return channel;
 }
 
-ObserverChannel::ObserverChannel(RunLoop& loop, FileDescriptor socket, Snapshot snapshot)
+ObserverChannel::ObserverChannel(RunLoop& loop, FileDescriptor socket, const std::string& path,
+                                 Snapshot snapshot)
     : loop_(loop),
       socket_(std::move(socket)),
+      boundPath_(path),
       snapshot_(std::move(snapshot)),
       watch_(std::make_unique<Watch>(loop, *this)) {}
 

@@ -11,6 +11,7 @@
 #include <string>
 #include <vector>
 
+#include "Helper/Platform/BoundPath.h"
 #include "Helper/Platform/FileDescriptor.h"
 #include "Helper/Platform/RunLoop.h"
 
@@ -24,7 +25,8 @@ class ObserverChannel {
   static constexpr std::size_t kMaxObservers = 8;
 
   /// Listens at `path` (SOCK_SEQPACKET, mode 0600), replacing what an earlier process left there.
-  /// `snapshot` gives the first packet of each observer. Null when the socket cannot be made.
+  /// `snapshot` gives the first packet of each observer. Null when the socket cannot be made. The
+  /// path is removed with the channel, unless another process has bound its own there since.
   [[nodiscard]] static std::unique_ptr<ObserverChannel> Open(RunLoop& loop, const std::string& path,
                                                              Snapshot snapshot);
   ~ObserverChannel();
@@ -39,13 +41,14 @@ class ObserverChannel {
  private:
   struct Watch;
   struct Observer;
-  ObserverChannel(RunLoop& loop, FileDescriptor socket, Snapshot snapshot);
+  ObserverChannel(RunLoop& loop, FileDescriptor socket, const std::string& path, Snapshot snapshot);
   void accept();
   void pause();
   void resume();
 
   RunLoop& loop_;
   const FileDescriptor socket_;
+  const BoundPath boundPath_;
   const Snapshot snapshot_;
   std::unique_ptr<Watch> watch_;
   std::shared_ptr<RunLoopTimer> pause_;  // ends it; null while the socket is watched

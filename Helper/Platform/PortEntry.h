@@ -4,27 +4,11 @@
 #pragma once
 
 #include <cstddef>
-#include <string>
 
+#include "Helper/Platform/BoundPath.h"
 #include "Helper/Platform/Port.h"
 
 namespace platform {
-
-/// The path of a service socket that this process bound; removes it when the right is given up,
-/// unless somebody has put another socket there since.
-class BoundPath {
- public:
-  BoundPath() = default;
-  explicit BoundPath(std::string path);
-  BoundPath(BoundPath&& other) noexcept;
-  BoundPath& operator=(BoundPath&& other) noexcept;
-  ~BoundPath();
-
- private:
-  std::string path_;
-  dev_t device_ = 0;
-  ino_t inode_ = 0;
-};
 
 struct PortEntry {
   SharedDescriptor receive;  // null when the receive right is not here

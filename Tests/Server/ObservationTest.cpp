@@ -243,6 +243,20 @@ TEST_F(ObservationTest, EndsWhileAnObserverWaits) {
   EXPECT_TRUE(support::IsHungUp(observer.get()));
 }
 
+TEST_F(ObservationTest, LeavesNoSocketBehind) {
+  ASSERT_TRUE(std::filesystem::exists(path()));
+  server->observation.reset();
+  EXPECT_FALSE(std::filesystem::exists(path()));
+}
+
+TEST_F(ObservationTest, LeavesTheSocketOfItsSuccessor) {
+  const auto successor =
+      platform::ObserverChannel::Open(loop, path(), [] { return std::vector<std::byte>(); });
+  ASSERT_NE(successor, nullptr);
+  server->observation.reset();
+  EXPECT_TRUE(std::filesystem::exists(path()));
+}
+
 TEST_F(ObservationTest, DoesNotDelayTheIdleExit) {
   const FileDescriptor observer = connectObserver();
   connect().reset();
