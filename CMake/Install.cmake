@@ -46,7 +46,7 @@ foreach(directory IN LISTS HALVEC_ENTITLEMENT_LIST)
   install(DIRECTORY DESTINATION ${directory} COMPONENT helper)
 endforeach()
 
-halvec_install_documents(helper halvec-mobile-helper.8 halvec-entitlements.5)
+halvec_install_documents(helper halvec-mobile-helper.8 halvec-entitlements.5 halvec-transport.7)
 
 # The client library, for who runs with it and for who builds with it.
 install(TARGETS HelperClientShared
@@ -80,12 +80,10 @@ configure_package_config_file(
   NO_CHECK_REQUIRED_COMPONENTS_MACRO)
 write_basic_package_version_file(
   ${PROJECT_BINARY_DIR}/Packaging/HalvecMobileHelperConfigVersion.cmake
-  COMPATIBILITY SameMajorVersion)
+  COMPATIBILITY SameMinorVersion)
 install(FILES ${PROJECT_BINARY_DIR}/Packaging/HalvecMobileHelperConfig.cmake
               ${PROJECT_BINARY_DIR}/Packaging/HalvecMobileHelperConfigVersion.cmake
         DESTINATION ${HALVEC_CONFIG_DIRECTORY} COMPONENT client-development)
-
-halvec_install_documents(client-development halvec-transport.7)
 
 # The command line, entitled where root runs it, and the simulated handset.
 install(TARGETS halvecctl DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT halvecctl)
