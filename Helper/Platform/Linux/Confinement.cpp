@@ -92,7 +92,10 @@ bool CoverTheSystem() {
 }
 
 void Require(bool done, const char* what) {
-  if (!done) Log(LogPriority::kError, "Cannot confine: %s: %s", what, std::strerror(errno));
+  if (done) return;
+  const char* const reason =
+      std::strerror(errno);  // NOLINT(concurrency-mt-unsafe): no other thread
+  Log(LogPriority::kError, "Cannot confine: %s: %s", what, reason);
 }
 
 }  // namespace
