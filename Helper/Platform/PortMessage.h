@@ -37,7 +37,8 @@ class ReceiveBuffer {
   ReceiveBuffer();
 
   /// Takes one message off the port `name`, whose receive right is `socket`. Forgets the previous
-  /// message, rights that nobody took included.
+  /// message, rights that nobody took included. On a named port memory is checked but not read: its
+  /// address is null.
   ReceiveStatus receive(PortName name, int socket, bool named);
 
   /// The message, 4-byte aligned, trailer behind it; valid until the next receive() or clear().
@@ -59,9 +60,9 @@ class ReceiveBuffer {
  private:
   struct Control;
   ReceiveStatus accept(PortName name, std::size_t length, Control& control, bool named);
-  bool readDescriptors(std::size_t length, Control& control);
+  bool readDescriptors(std::size_t length, Control& control, bool named);
   bool readMemory(std::byte* descriptor, std::size_t& inlineAt, std::size_t length,
-                  Control& control);
+                  Control& control, bool named);
   void writeTrailer(const Control& control, bool named);
 
   static constexpr std::size_t kHeadRoom = 64;  // a trailer fits between message and data

@@ -138,7 +138,7 @@ ReceiveStatus ReceiveBuffer::accept(PortName name, std::size_t length, Control& 
   header.voucherPort = kPortNull;
   wire::Store(message_, header);
   const bool complex = (header.bits & wire::kComplexBit) != 0;
-  if (complex ? !readDescriptors(length, control) : header.size != length) {
+  if (complex ? !readDescriptors(length, control, named) : header.size != length) {
     return ReceiveStatus::kRefused;
   }
   if (header.size < length) {
@@ -153,7 +153,7 @@ ReceiveStatus ReceiveBuffer::accept(PortName name, std::size_t length, Control& 
 /// Fills names and addresses in, one descriptor after the other. A count or type that this layer
 /// does not know ends the walk without refusing the message: what such a message is answered is for
 /// the routine's own check to say.
-bool ReceiveBuffer::readDescriptors(std::size_t length, Control& control) {
+bool ReceiveBuffer::readDescriptors(std::size_t length, Control& control, bool named) {
   const std::size_t size = header().size;
   std::size_t inlineAt = size;
   std::size_t at = wire::kFirstDescriptorOffset;
@@ -181,7 +181,7 @@ bool ReceiveBuffer::readDescriptors(std::size_t length, Control& control) {
       at += wire::kPortDescriptorSize;
     } else if (type == wire::kOutOfLineDescriptorType) {
       if (at + wire::kOutOfLineDescriptorSize > size) return true;
-      if (!readMemory(descriptor, inlineAt, length, control)) return false;
+      if (!readMemory(descriptor, inlineAt, length, control, named)) return false;
       at += wire::kOutOfLineDescriptorSize;
     } else {
       return true;
@@ -192,7 +192,7 @@ bool ReceiveBuffer::readDescriptors(std::size_t length, Control& control) {
 
 /// Finds the bytes of one out-of-line descriptor: behind the message at `inlineAt`, or in a memfd.
 bool ReceiveBuffer::readMemory(std::byte* descriptor, std::size_t& inlineAt, std::size_t length,
-                               Control& control) {
+                               Control& control, bool named) {
   const auto place = wire::Load<std::uint64_t>(descriptor);
   const std::size_t size = wire::Load<std::uint32_t>(descriptor + wire::kOutOfLineCountOffset);
   const std::byte* bytes = nullptr;
@@ -205,7 +205,9 @@ bool ReceiveBuffer::readMemory(std::byte* descriptor, std::size_t& inlineAt, std
     }
     Memory& memory = memory_.emplace_back();
     memory.file = std::move(file);
-    if (!ReadSealed(memory.file.get(), memory.bytes, size)) return false;
+    // No message to a named port carries memory, so what anybody may send there is not worth a
+    // copy.
+    if (!named && !ReadSealed(memory.file.get(), memory.bytes, size)) return false;
     bytes = memory.bytes.get();
   } else if (size > 0) {
     if (size > length - inlineAt) return false;

@@ -202,6 +202,15 @@ TEST_F(PortMessage, ReadsSealedMemoryOfAnySize) {
   }
 }
 
+TEST_F(PortMessage, OnANamedPortHasItsMemoryCheckedButNotRead) {
+  const FileDescriptor file = sealed("0123456789");
+  ASSERT_EQ(support::SendPacket(sender->get(), withMemory(44, 10, 1), {file.get()}), 0);
+  ASSERT_EQ(buffer.receive(name, socket->get(), /*named=*/true), ReceiveStatus::kMessage);
+  EXPECT_EQ(wire::Load<std::uint64_t>(buffer.message() + 28), 0U) << "there is no copy";
+  ASSERT_EQ(support::SendPacket(sender->get(), withMemory(44, 11, 1), {file.get()}), 0);
+  EXPECT_EQ(buffer.receive(name, socket->get(), /*named=*/true), ReceiveStatus::kRefused);
+}
+
 TEST_F(PortMessage, LeavesTheFileOffsetOfSealedMemoryAlone) {
   const FileDescriptor file = sealed("0123456789");
   ASSERT_EQ(::lseek(file.get(), 4, SEEK_SET), 4);

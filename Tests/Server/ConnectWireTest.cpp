@@ -77,6 +77,25 @@ TEST_F(ConnectWire, WithAnyOtherDescriptorCountGetsMinus304) {
   }
 }
 
+TEST_F(ConnectWire, WithMemoryGetsMinus304WhereverItsBytesAre) {
+  for (const std::uint64_t place : {0U, 1U, 2U}) {
+    for (const std::uint32_t size : {44U, 60U}) {
+      Bytes request = support::ConnectRequest();
+      request.resize(size);
+      Put(request, 4, size);
+      Put(request, 24, size == 44 ? 1U : 2U);
+      for (std::size_t at = 28; at < size; at += 16) {
+        Put(request, at, place);
+        request[at + 11] = 1;
+        Put(request, at + 12, 8U);
+      }
+      EXPECT_EQ(replyTo(request), errorReply(-304)) << place << ", " << size;
+      request.resize(size + (size == 44 ? 8 : 16), 'm');
+      EXPECT_EQ(replyTo(request), errorReply(-304)) << place << ", behind " << size;
+    }
+  }
+}
+
 TEST_F(ConnectWire, WithACopySendOrMakeSendDescriptorGetsMinus300) {
   for (const int disposition : {16, 18, 19, 20, 21, 0, 255}) {
     Bytes request = support::ConnectRequest();
