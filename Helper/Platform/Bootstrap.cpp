@@ -77,22 +77,22 @@ KernReturn CodeOfErrno() {
              : KERN_FAILURE;
 }
 
-/// Held by the one process that replaces an abandoned socket. A file of its own, which no other
-/// user can open and so keep locked, and which goes away with the lock.
-class ReplacementLock {
+/// Held by the one process that takes a service's name. A file of its own, in a folder that only
+/// the owner writes to, so that no other user can keep it locked; it goes away with the lock.
+class NameLock {
  public:
-  explicit ReplacementLock(std::string path) : path_(std::move(path)) {
+  explicit NameLock(std::string path) : path_(std::move(path)) {
     constexpr int kFlags = O_RDWR | O_CREAT | O_NOFOLLOW | O_CLOEXEC;
     do {
       file_.reset(::open(path_.c_str(), kFlags, S_IRUSR | S_IWUSR));
       if (file_ && ::flock(file_.get(), LOCK_EX) != 0) file_.reset();
     } while (file_ && !isInPlace());  // it went away with another's lock meanwhile
   }
-  ~ReplacementLock() {
+  ~NameLock() {
     if (file_) (void)::unlink(path_.c_str());
   }
-  ReplacementLock(const ReplacementLock&) = delete;
-  ReplacementLock& operator=(const ReplacementLock&) = delete;
+  NameLock(const NameLock&) = delete;
+  NameLock& operator=(const NameLock&) = delete;
 
   [[nodiscard]] explicit operator bool() const { return static_cast<bool>(file_); }
 
@@ -117,32 +117,61 @@ bool BindForGroup(const FileDescriptor& socket, const UnixSocketAddress& address
   return bound;
 }
 
-/// Whether somebody serves, or may serve, the socket at `address`.
-bool IsServed(const UnixSocketAddress& address) {
+/// A folder for one socket until that is moved to its place, which nobody else can enter or
+/// foresee.
+class FolderForSocket {
+ public:
+  explicit FolderForSocket(std::string pattern) : folder_(std::move(pattern)) {
+    if (!::mkdtemp(folder_.data())) folder_.clear();
+  }
+  ~FolderForSocket() {
+    if (folder_.empty()) return;
+    (void)::unlink(socketPath().c_str());  // still there only where it could not be moved
+    (void)::rmdir(folder_.c_str());
+  }
+  FolderForSocket(const FolderForSocket&) = delete;
+  FolderForSocket& operator=(const FolderForSocket&) = delete;
+
+  [[nodiscard]] explicit operator bool() const { return !folder_.empty(); }
+  [[nodiscard]] std::string socketPath() const { return folder_ + "/port"; }
+
+ private:
+  std::string folder_;
+};
+
+/// Whether a service of this user or of root serves, or may serve, the socket at `path`. Others can
+/// put theirs there, where they may write to the folder; that makes them no service.
+bool IsServed(const std::string& path, const UnixSocketAddress& address) {
+  struct stat found {};
+  if (::lstat(path.c_str(), &found) != 0) return errno != ENOENT;
+  if (found.st_uid != ::geteuid() && found.st_uid != 0) return false;
   const FileDescriptor probe(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
   return !probe || ::connect(probe.get(), address.get(), address.size()) == 0 ||
          errno != ECONNREFUSED;
 }
 
-/// Binds the service's socket. A socket that nobody serves any more is replaced.
+/// Binds the service's socket, in place of one that nobody serves any more. No service's name
+/// begins with a dot, so none meets what is made here for the moment.
 KernReturn Bind(const std::string& directory, const std::string& service, PortEntry& entry) {
   const std::string path = directory + "/" + service;
   const UnixSocketAddress address(path);
   if (!address) return KERN_INVALID_ARGUMENT;
   FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
   if (!socket || !AskForSenders(socket.get())) return CodeOfErrno();
-  if (!BindForGroup(socket, address)) {
-    if (errno != EADDRINUSE) return CodeOfErrno();
-    if (IsServed(address)) return KERN_NO_ACCESS;
-    // From the second look to the removal no other process may put its own there. No service's name
-    // begins with a dot.
-    const ReplacementLock lock(directory + "/." + service + ".lock");
-    if (!lock) return CodeOfErrno();
-    if (IsServed(address)) return KERN_NO_ACCESS;
-    (void)::unlink(path.c_str());  // what matters is whether bind succeeds
-    if (!BindForGroup(socket, address)) return errno == EADDRINUSE ? KERN_NO_ACCESS : CodeOfErrno();
+  // From the look at what is there to its replacement no other helper may put its own there.
+  const std::string parent = directory.substr(0, directory.rfind('/'));
+  const NameLock lock(parent + "/." + service + ".lock");
+  if (!lock) return CodeOfErrno();
+  if (IsServed(path, address)) return KERN_NO_ACCESS;
+  const FolderForSocket folder(directory + "/." + service + ".XXXXXX");
+  if (!folder) return CodeOfErrno();
+  const UnixSocketAddress ownAddress(folder.socketPath());
+  if (!ownAddress) return KERN_INVALID_ARGUMENT;
+  // Moved there, it takes the old one's place at once: at no time is the name free for others.
+  if (!BindForGroup(socket, ownAddress) ||
+      ::rename(folder.socketPath().c_str(), path.c_str()) != 0) {
+    return CodeOfErrno();
   }
-  entry.boundPath = BoundPath(path);
   entry.receive = std::make_shared<const FileDescriptor>(std::move(socket));
   return KERN_SUCCESS;
 }

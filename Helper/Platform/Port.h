@@ -33,7 +33,8 @@ KernReturn PortDropReceiveRight(PortName name);
 KernReturn PortDeallocate(PortName name);
 
 /// Checks in a named service: takes its receive right over from the service launcher, or binds it
-/// where no launcher holds it (socket mode 0660, removed again when the right is given up).
+/// where no launcher holds it (socket mode 0660; its file stays when the right is given up, so that
+/// nobody else can bind the name).
 /// KERN_SUCCESS; KERN_INVALID_ARGUMENT for a name that is no file name; KERN_NO_ACCESS when another
 /// process serves the name; KERN_RESOURCE_SHORTAGE; KERN_FAILURE for any other reason.
 [[nodiscard]] KernReturn BootstrapCheckIn(const char* serviceName, PortName& name);

@@ -15,7 +15,6 @@ struct PortEntry {
   SharedDescriptor send;     // the other end; null for a service port
   std::size_t sendReferences = 0;
   SharedDescriptor holder;
-  BoundPath boundPath;
   [[nodiscard]] bool named() const { return receive && !send; }
 };
 

@@ -19,7 +19,6 @@
 #include <initializer_list>
 #include <iterator>
 
-#include "Helper/Platform/PortEntry.h"
 #include "Helper/Platform/PortWatcher.h"
 #include "Helper/Platform/ProcessIdentity.h"
 #include "Helper/Platform/RunLoop.h"
@@ -171,8 +170,17 @@ TEST_F(CheckInWithoutLauncher, BindsTheServicesSocketForOwnerAndGroupOnly) {
               if (::stat(kOwnPath, &status) != 0) return 2;
               if (!S_ISSOCK(status.st_mode) || (status.st_mode & 07777) != 0660) return 3;
               if (!PortQuery(name)->named) return 4;
-              if (PortDeallocate(name) != KERN_SUCCESS) return 5;
-              return ::stat(kOwnPath, &status) == 0 ? 6 : 0;
+              return 0;
+            }),
+            0);
+}
+
+TEST_F(CheckInWithoutLauncher, LeavesTheNameToNobodyElseWhenTheRightIsGivenUp) {
+  EXPECT_EQ(InPrivateRun([] {
+              PortName name = kPortNull;
+              if (BootstrapCheckIn("com.example.own", name) != KERN_SUCCESS) return 1;
+              if (PortDeallocate(name) != KERN_SUCCESS) return 2;
+              return ::access(kOwnPath, F_OK) == 0 ? 0 : 3;
             }),
             0);
 }
@@ -183,11 +191,8 @@ TEST_F(CheckInWithoutLauncher, DoesNotTakeAServedNameButReplacesAnAbandonedOne) 
               PortName second = kPortNull;
               if (BootstrapCheckIn("com.example.own", first) != KERN_SUCCESS) return 1;
               if (BootstrapCheckIn("com.example.own", second) != KERN_NO_ACCESS) return 2;
-              // Renamed away and back, the socket stays behind when its owner is gone.
-              if (::rename(kOwnPath, "/run/away") != 0) return 3;
               (void)PortDeallocate(first);
-              if (::rename("/run/away", kOwnPath) != 0) return 4;
-              return BootstrapCheckIn("com.example.own", second) == KERN_SUCCESS ? 0 : 5;
+              return BootstrapCheckIn("com.example.own", second) == KERN_SUCCESS ? 0 : 3;
             }),
             0);
 }
@@ -223,6 +228,12 @@ class HeldCheckIn {
              std::find(calls.begin(), calls.end(), call_.entry.nr) == calls.end());
     return true;
   }
+  /// Runs on until the call that it is about to make has returned; false when it ended before.
+  bool returns() {
+    int status = 0;
+    return ::ptrace(PTRACE_SYSCALL, process_, nullptr, nullptr) == 0 &&
+           ::waitpid(process_, &status, 0) == process_ && WIFSTOPPED(status);
+  }
   /// Runs on to the end, where it is held alive with what it has bound, and gives the outcome.
   KernReturn outcome() {
     if (call_.entry.nr != SYS_exit_group && !runTo({SYS_exit_group})) return KERN_FAILURE;
@@ -234,20 +245,68 @@ class HeldCheckIn {
   __ptrace_syscall_info call_{};
 };
 
+/// The calls by which one file can take another's place, or make room for it.
+constexpr std::initializer_list<std::uint64_t> kReplacing {
+  SYS_unlinkat, SYS_renameat2,
+#if defined(__x86_64__)
+      SYS_unlink, SYS_rename, SYS_renameat,
+#endif
+};
+
+TEST_F(CheckInWithoutLauncher, LeavesNoGapWhileItReplacesAnAbandonedSocket) {
+  EXPECT_EQ(InPrivateRun([] {
+              PortName abandoned = kPortNull;
+              if (BootstrapCheckIn("com.example.own", abandoned) != KERN_SUCCESS) return 1;
+              (void)PortDeallocate(abandoned);
+              HeldCheckIn next;
+              int stops = 0;
+              for (; next.runTo(kReplacing) && next.returns(); ++stops) {
+                if (::access(kOwnPath, F_OK) != 0) return 2;
+              }
+              return stops > 0 ? 0 : 3;
+            }),
+            0);
+}
+
+TEST_F(CheckInWithoutLauncher, TakesANameFromAnotherUsersSocket) {
+  EXPECT_EQ(InPrivateRun([] {
+              PortName others = kPortNull;
+              PortName own = kPortNull;
+              struct stat status {};
+              if (BootstrapCheckIn("com.example.own", others) != KERN_SUCCESS) return 1;
+              if (::lchown(kOwnPath, 12345, 12345) != 0) return 2;
+              if (BootstrapCheckIn("com.example.own", own) != KERN_SUCCESS) return 3;
+              return ::stat(kOwnPath, &status) == 0 && status.st_uid == ::geteuid() ? 0 : 4;
+            }),
+            0);
+}
+
+TEST_F(CheckInWithoutLauncher, TakesItsGroupFromTheFolder) {
+  EXPECT_EQ(InPrivateRun([] {
+              struct stat status {};
+              const std::filesystem::path folder = std::filesystem::path(kOwnPath).parent_path();
+              std::filesystem::create_directories(folder);
+              if (::chown(folder.c_str(), 0, 12345) != 0) return 1;
+              if (::chmod(folder.c_str(), 03775) != 0) return 2;
+              PortName name = kPortNull;
+              if (BootstrapCheckIn("com.example.own", name) != KERN_SUCCESS) return 3;
+              return ::stat(kOwnPath, &status) == 0 && status.st_gid == 12345 ? 0 : 4;
+            }),
+            0);
+}
+
 TEST_F(CheckInWithoutLauncher, SucceedsForOneOfTwoThatFindTheSameAbandonedSocket) {
   EXPECT_EQ(InPrivateRun([] {
               PortName abandoned = kPortNull;
               if (BootstrapCheckIn("com.example.own", abandoned) != KERN_SUCCESS) return 1;
-              if (::rename(kOwnPath, "/run/away") != 0) return 2;
               (void)PortDeallocate(abandoned);
-              if (::rename("/run/away", kOwnPath) != 0) return 3;
               // The first has found that nobody serves the socket, and has not replaced it yet.
               HeldCheckIn first;
-              if (!first.runTo({SYS_connect}) || !first.runTo({SYS_unlink, SYS_unlinkat})) return 4;
+              if (!first.runTo({SYS_connect}) || !first.runTo(kReplacing)) return 2;
               HeldCheckIn second;
-              if (!second.runTo({SYS_flock, SYS_exit_group})) return 5;
-              if (first.outcome() != KERN_SUCCESS) return 6;
-              return second.outcome() == KERN_NO_ACCESS ? 0 : 7;
+              if (!second.runTo({SYS_flock, SYS_exit_group})) return 3;
+              if (first.outcome() != KERN_SUCCESS) return 4;
+              return second.outcome() == KERN_NO_ACCESS ? 0 : 5;
             }),
             0);
 }
@@ -257,8 +316,10 @@ TEST_F(CheckInWithoutLauncher, LeavesNothingButItsSocketInTheFolder) {
               for (int round = 0; round < 3; ++round) {
                 // The second and the third find what the one before has left behind.
                 if (HeldCheckIn().outcome() != KERN_SUCCESS) return 1;
-                const std::filesystem::directory_iterator entries("/run/halvec/ports");
-                if (std::distance(begin(entries), end(entries)) != 1) return 2;
+                for (const char* folder : {"/run/halvec/ports", "/run/halvec"}) {
+                  const std::filesystem::directory_iterator entries(folder);
+                  if (std::distance(begin(entries), end(entries)) != 1) return 2;
+                }
               }
               return 0;
             }),
@@ -281,21 +342,6 @@ TEST(CheckIn, RefusesNamesThatAreNoFileNames) {
     PortName name = kPortNull;
     EXPECT_EQ(BootstrapCheckIn(service, name), KERN_INVALID_ARGUMENT) << service;
   }
-}
-
-TEST(BoundPath, RemovesItsOwnSocketOnly) {
-  const LauncherSocket first("socket");
-  { const BoundPath path(first.path()); }
-  EXPECT_NE(::access(first.path().c_str(), F_OK), 0);
-  const LauncherSocket second("socket");
-  const std::string moved = second.path() + ".old";
-  {
-    const BoundPath path(second.path());
-    ASSERT_EQ(::rename(second.path().c_str(), moved.c_str()), 0);
-    ASSERT_EQ(::symlink("elsewhere", second.path().c_str()), 0);
-  }
-  EXPECT_EQ(::unlink(second.path().c_str()), 0) << "what somebody else put there must stay";
-  ::unlink(moved.c_str());
 }
 
 class PortDeath : public ::testing::Test {
