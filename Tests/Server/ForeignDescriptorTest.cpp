@@ -103,7 +103,6 @@ TEST_F(ForeignDescriptor, InsideAReplyRightKeepsNobodyWaiting) {
   sendToService(support::ConnectRequest(), {reply.send.get(), own.send.get()});
   reply.send.reset();
   pump();
-  EXPECT_EQ(support::ReceivePacket(reply.receive.get()).bytes.size(), 40U);
   expectGoodClientIsServed();
 }
 
