@@ -75,12 +75,12 @@ TEST_F(Life, EndsWithStatus1AndTwoLinesWhenThePortCannotBeCheckedIn) {
   EXPECT_LT(first, second);
 }
 
-TEST_F(Life, WithoutALauncherServesUnderItsOwnName) {
+TEST_F(Life, WithoutALauncherServesUnderItsOwnNameAndLeavesThatToNobody) {
   const Outcome outcome =
       run("rm /run/halvec/ports/*; /usr/libexec/halvec/helper &\n"
           "until [ -S /run/halvec/ports/com.zarvo.halvec.mobile-helper ]; do :; done\n"
           "stat -c %a /run/halvec/ports/*; client connect; wait $!; echo $?; ls /run/halvec/ports");
-  EXPECT_EQ(outcome.output, "660\n0\n0\n") << outcome.errors;
+  EXPECT_EQ(outcome.output, "660\n0\n0\ncom.zarvo.halvec.mobile-helper\n") << outcome.errors;
 }
 
 }  // namespace
