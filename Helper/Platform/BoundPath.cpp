@@ -15,16 +15,6 @@ BoundPath::BoundPath(std::string path) : path_(std::move(path)) {
   inode_ = status.st_ino;
 }
 
-BoundPath::BoundPath(BoundPath&& other) noexcept
-    : path_(std::exchange(other.path_, {})), device_(other.device_), inode_(other.inode_) {}
-
-BoundPath& BoundPath::operator=(BoundPath&& other) noexcept {
-  std::swap(path_, other.path_);
-  std::swap(device_, other.device_);
-  std::swap(inode_, other.inode_);
-  return *this;
-}
-
 BoundPath::~BoundPath() {
   struct stat status {};
   if (path_.empty() || ::lstat(path_.c_str(), &status) != 0) return;

@@ -14,12 +14,10 @@ namespace platform {
 /// put another file there since.
 class BoundPath {
  public:
-  /// Owns no path.
-  BoundPath() = default;
   /// Owns `path`, at which a socket has just been bound; nothing if there is none.
   explicit BoundPath(std::string path);
-  BoundPath(BoundPath&& other) noexcept;
-  BoundPath& operator=(BoundPath&& other) noexcept;
+  BoundPath(const BoundPath&) = delete;
+  BoundPath& operator=(const BoundPath&) = delete;
   ~BoundPath();
 
  private:

@@ -5,7 +5,6 @@
 
 #include <cstddef>
 
-#include "Helper/Platform/BoundPath.h"
 #include "Helper/Platform/Port.h"
 
 namespace platform {
